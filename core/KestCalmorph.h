@@ -1,0 +1,74 @@
+#pragma once
+// KestCalmorph: the converter. Reads a CDF file into a KestCdfCalData tree, writes a tree to a
+// CDF file, and answers the schema checks around a file.
+
+#include <string>
+
+#include "../model/KestCdfCalData.h"
+#include "../platform/CComBSTR.h"
+#include "../platform/XmlDom.h"
+#include "KestCalmorphDLLError.h"
+
+namespace kest {
+
+/// The namespace URI under which the CDF schema is registered for validation.
+constexpr const OLECHAR* kCdfNamespaceURI = u"http://kest.dev/schemas/cdf/1.0";
+/// The conventional file name of the CDF schema.
+constexpr const char* kCdfSchemaFileName = "cdf.xsd";
+
+class KestCalmorph {
+public:
+    KestCalmorph();
+    KestCalmorph(const KestCalmorph& other);
+    KestCalmorph& operator=(const KestCalmorph& other);
+    ~KestCalmorph();
+
+    /// Loads the file (validating it against the schema it names) and converts its CAL-DATA
+    /// element into the converter's tree; returns a copy of that tree. A file that does not load
+    /// is no exception: the tree stays as it was and, when `wantMessage` is true, `message`
+    /// receives the parser's reason. Conversion errors throw KestCalmorphDLLError.
+    KestCdfCalData ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CComBSTR& message);
+    /// Writes `data` to `outputPath` as a UTF-8 CDF file, with `comment` as the first child of
+    /// CAL-DATA when not empty. False for an empty path; throws KestCalmorphDLLError when the
+    /// tree is incomplete (nothing is written) and _com_error when saving fails.
+    bool ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment);
+    /// A new default tree; the converter is not touched.
+    KestCdfCalData ConvertCPPToXML();
+
+    /// A document a host parked on the converter (empty when none).
+    IXMLDOMDocument2Ptr GetDocumentPointer();
+    void SetDocumentPointer(IXMLDOMDocument2Ptr document);
+
+    /// True when the DOM service (parser, validator, document creation) is usable; otherwise
+    /// writes "\nError: MSXML 4.0 is not installed. Exiting.\n" to standard error.
+    bool IsMSXML4Installed();
+    /// The schema location the file's root names in "xsi:schemaLocation" (the text after the
+    /// first blank); empty with the parser's reason in `message` when the file does not load.
+    CComBSTR DetectSchemaLocation(CComBSTR path, CComBSTR& message);
+    /// Whether a schema location can be reached: an http URL that loads, "cdf.xsd" beside the
+    /// data file, or any other location as a readable path.
+    bool IsSchemaLocationValid(CComBSTR location, CComBSTR path);
+    /// Validates the data file against the schema file under the CDF namespace URI: empty when
+    /// valid, "FAIL" when the data file did not load without a reason, else the reason.
+    CComBSTR ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR schemaPath);
+
+    /// True when a server file name reads as "msxml" followed by a version of at least 4.0.
+    static bool IsSupportedServerFileName(const char* fileName);
+
+private:
+    CComBSTR LoadXMLFile(CComBSTR path, IXMLDOMDocument2Ptr document, bool wantMessage);
+    long VisitCalDataNodes(IXMLDOMNodePtr node);
+    const OLECHAR* ConvertXMLNode(IXMLDOMNodePtr node);
+    long LoadDocumentSync(IXMLDOMDocument* document, const OLECHAR* path);
+    void CreateXMLEnvironment();
+    bool SaveDocument(CComBSTR path);
+    void NewXMLNodeElement(const OLECHAR* name);
+    std::string GetFilePath(CComBSTR path);
+
+    KestCdfCalData m_calData;
+    IXMLDOMDocument* m_writeDocument = nullptr;
+    IXMLDOMNodePtr m_currentNode;
+    IXMLDOMDocument2Ptr m_documentPointer;
+};
+
+}  // namespace kest

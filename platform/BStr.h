@@ -1,0 +1,51 @@
+#pragma once
+// BSTR: a length-prefixed, zero-terminated UTF-16 string; a null BSTR reads as empty.
+//
+// Narrow text is UTF-8 everywhere in this library. Conversions never fail on bad input:
+// an invalid UTF-8 sequence becomes U+FFFD (one per maximal ill-formed subsequence), and an
+// unpaired surrogate becomes U+FFFD on the way to UTF-8.
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+#include "HResult.h"
+
+namespace kest {
+
+using OLECHAR = char16_t;
+using BSTR = OLECHAR*;
+using LPCOLESTR = const OLECHAR*;
+
+/// New BSTR holding a copy of the zero-terminated text; null for a null argument or no memory.
+BSTR SysAllocString(const OLECHAR* text) noexcept;
+/// New BSTR of `length` characters copied from `text` (zero-filled when `text` is null).
+BSTR SysAllocStringLen(const OLECHAR* text, UINT length) noexcept;
+/// New BSTR of `bytes` bytes copied from `data` (zero-filled when null); the bytes are not
+/// converted, as on the platform this type comes from.
+BSTR SysAllocStringByteLen(const char* data, UINT bytes) noexcept;
+/// Frees a BSTR made by the Sys* functions; null is allowed.
+void SysFreeString(BSTR text) noexcept;
+/// Replaces *target with a new copy of the text; false when memory runs out.
+bool SysReAllocString(BSTR* target, const OLECHAR* text) noexcept;
+/// Number of UTF-16 code units; 0 for null.
+UINT SysStringLen(BSTR text) noexcept;
+/// Number of bytes; 0 for null.
+UINT SysStringByteLen(BSTR text) noexcept;
+
+/// Ordinal, case-sensitive comparison (null equals empty): VARCMP_LT, VARCMP_EQ or VARCMP_GT.
+/// The locale and flags are accepted for compatibility and do not change the result.
+HRESULT VarBstrCmp(BSTR left, BSTR right, LCID lcid, ULONG flags) noexcept;
+
+/// UTF-8 to UTF-16 (invalid sequences become U+FFFD).
+std::u16string Utf8ToUtf16(std::string_view utf8);
+/// UTF-16 to UTF-8 (unpaired surrogates become U+FFFD).
+std::string Utf16ToUtf8(std::u16string_view utf16);
+/// New BSTR from UTF-8 text; null when memory runs out.
+BSTR SysAllocStringFromUtf8(std::string_view utf8) noexcept;
+/// View of a BSTR's text (empty for null), embedded zeros included.
+inline std::u16string_view BstrView(BSTR text) noexcept {
+    return text ? std::u16string_view(text, SysStringLen(text)) : std::u16string_view();
+}
+
+}  // namespace kest

@@ -1,0 +1,26 @@
+#pragma once
+// IXMLDOMSchemaCollection: compiled XSD schemas by target namespace, attached to documents
+// for validate().
+
+#include "IXMLDOMNode.h"
+
+namespace kest {
+
+class IXMLDOMSchemaCollection : public RefCounted {
+public:
+    /// Compiles the schema at `location` (a path or, when allowed, a URL) and registers it under
+    /// `namespaceURI`. Throws _com_error when it cannot be read or compiled, or when its target
+    /// namespace differs from `namespaceURI`; the collection is then unchanged.
+    virtual void add(const _bstr_t& namespaceURI, const _variant_t& location) = 0;
+    virtual long Getlength() = 0;
+    /// The namespace URI at index, or E_INVALIDARG outside the collection.
+    virtual _bstr_t GetnamespaceURI(long index) = 0;
+    /// Removes the schema of that namespace, if any.
+    virtual void remove(const _bstr_t& namespaceURI) = 0;
+
+    /// Creates an empty collection for ProgID "Msxml2.XMLSchemaCache.4.0"; the caller owns the
+    /// returned reference count of zero through ComPtr. Other names give REGDB_E_CLASSNOTREG.
+    static HRESULT CreateInstance(const OLECHAR* progId, IXMLDOMSchemaCollection** result) noexcept;
+};
+
+}  // namespace kest

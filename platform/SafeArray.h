@@ -1,0 +1,50 @@
+#pragma once
+// SAFEARRAY: one-dimensional arrays of VARIANTs (the only kind this library uses).
+
+#include "HResult.h"
+
+namespace kest {
+
+struct tagVARIANT;
+using VARIANT = tagVARIANT;
+using VARTYPE = std::uint16_t;
+
+struct SAFEARRAYBOUND {
+    ULONG cElements;
+    LONG lLbound;
+};
+
+/// An array descriptor. Only one dimension and VARIANT elements are supported; the data is
+/// owned by the descriptor and released by SafeArrayDestroy.
+struct SAFEARRAY {
+    USHORT cDims;
+    USHORT fFeatures;
+    ULONG cbElements;
+    ULONG cLocks;
+    VARIANT* pvData;
+    SAFEARRAYBOUND rgsabound[1];
+};
+
+/// New array of `count` empty VARIANTs with the given lower bound; null unless vt is VT_VARIANT
+/// or memory runs out.
+SAFEARRAY* SafeArrayCreateVector(VARTYPE vt, LONG lowerBound, ULONG count) noexcept;
+/// New array from bounds; only one dimension of VT_VARIANT is supported.
+SAFEARRAY* SafeArrayCreate(VARTYPE vt, UINT dims, SAFEARRAYBOUND* bounds) noexcept;
+/// Clears every element and frees the array; E_INVALIDARG for null, DISP_E_ARRAYISLOCKED when locked.
+HRESULT SafeArrayDestroy(SAFEARRAY* array) noexcept;
+/// Stores a copy of *value (a VARIANT) at *index; DISP_E_BADINDEX outside the bounds.
+HRESULT SafeArrayPutElement(SAFEARRAY* array, const LONG* index, const void* value) noexcept;
+/// Copies the element at *index into *value (a VARIANT, overwritten without clearing).
+HRESULT SafeArrayGetElement(SAFEARRAY* array, const LONG* index, void* value) noexcept;
+/// Resizes to bound->cElements elements keeping those below; new elements are empty.
+HRESULT SafeArrayRedim(SAFEARRAY* array, SAFEARRAYBOUND* bound) noexcept;
+/// Deep copy of the array and its elements.
+HRESULT SafeArrayCopy(SAFEARRAY* array, SAFEARRAY** copy) noexcept;
+HRESULT SafeArrayGetLBound(SAFEARRAY* array, UINT dim, LONG* bound) noexcept;
+HRESULT SafeArrayGetUBound(SAFEARRAY* array, UINT dim, LONG* bound) noexcept;
+UINT SafeArrayGetDim(SAFEARRAY* array) noexcept;
+/// Direct access to the element storage; pair with SafeArrayUnaccessData.
+HRESULT SafeArrayAccessData(SAFEARRAY* array, void** data) noexcept;
+HRESULT SafeArrayUnaccessData(SAFEARRAY* array) noexcept;
+
+}  // namespace kest

@@ -1,0 +1,26 @@
+// Test entry point: after every test, no platform object may be left alive.
+#include <gtest/gtest.h>
+
+#include "platform/ComPtr.h"
+
+namespace {
+
+class LiveObjectCheck : public ::testing::EmptyTestEventListener {
+    long m_before = 0;
+    void OnTestStart(const ::testing::TestInfo&) override {
+        m_before = kest::RefCounted::LiveObjects();
+    }
+    void OnTestEnd(const ::testing::TestInfo& info) override {
+        long after = kest::RefCounted::LiveObjects();
+        EXPECT_EQ(m_before, after) << "platform objects leaked by " << info.test_suite_name()
+                                   << "." << info.name();
+    }
+};
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    ::testing::InitGoogleTest(&argc, argv);
+    ::testing::UnitTest::GetInstance()->listeners().Append(new LiveObjectCheck);
+    return RUN_ALL_TESTS();
+}
