@@ -1,0 +1,66 @@
+#pragma once
+// KestCdfAxis: one axis of a calibration item, the points of an AXIS element with its size,
+// units and format type.
+
+#include "../platform/Automation.h"
+#include "../platform/XmlDom.h"
+#include "../text/KestCdfNormalizedString.h"
+
+namespace kest {
+
+class KestCdfAxis {
+public:
+    /// An empty axis: value VT_EMPTY, size 0, empty units and format type.
+    KestCdfAxis();
+    /// Deep copies of the value (array and elements) and both strings.
+    KestCdfAxis(const KestCdfAxis& other);
+    KestCdfAxis& operator=(const KestCdfAxis& other);
+    ~KestCdfAxis();
+
+    /// A deep copy of the stored points (VT_EMPTY, or VT_ARRAY|VT_VARIANT).
+    _variant_t GetAxisValue() const;
+    /// Stores new points read from `value` according to the format type, which must be set
+    /// first. "NUMERIC" splits the text at spaces into VT_I4 or (when the text holds a '.')
+    /// VT_R8 points, "STRING" takes the quoted strings, "LABEL" keeps the value as one point;
+    /// any other format type leaves the stored value alone. A value without a text form (an
+    /// array) throws _com_error and changes nothing.
+    void SetAxisValue(_variant_t value);
+
+    /// The number carried by the size attribute; never checked against the points.
+    unsigned int GetSize() const noexcept { return m_size; }
+    void SetSize(unsigned int size) noexcept { m_size = size; }
+    /// Copies of the units and the format type.
+    KestCdfNormalizedString GetSwUnits() const { return m_swUnits; }
+    KestCdfNormalizedString GetFormatType() const { return m_formatType; }
+    /// Verbatim copies; the stored value is not converted again.
+    void SetSwUnits(KestCdfNormalizedString units) { m_swUnits = units; }
+    void SetFormatType(KestCdfNormalizedString formatType) { m_formatType = formatType; }
+
+    /// Reads an AXIS element: its first three attributes by position (size, units, format
+    /// type), then the value of its last child node. Throws KestCalmorphDLLError 20 without an
+    /// attribute map, 11 when an attribute is missing; _com_error for an absent node or a size
+    /// that is no number. Returns true.
+    bool ConvertAxisNode(IXMLDOMNodePtr node);
+    /// Appends a new AXIS element (namespace `ns`) to `parent` with the attributes size,
+    /// sw-units and format-type and the points as text. Throws KestCalmorphDLLError 27 when the
+    /// new element has no attribute map and 26 when the value is VT_EMPTY (the element stays
+    /// attached); _com_error for an absent parent or document. Returns true.
+    bool ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+                              KestCdfNormalizedString ns);
+
+private:
+    void SetAxisAttributes(IXMLDOMNamedNodeMapPtr attributes);
+    unsigned int GetNodeValue(IXMLDOMNodePtr node);
+    _bstr_t GetNodeString(IXMLDOMNodePtr node);
+    int CountValues(_bstr_t text);
+    _variant_t PutNumbersIntoSafeArray(_variant_t value, _variant_t array);
+    void PutStringsIntoSafeArray(_variant_t value, _variant_t& array);
+    _variant_t GetNumbersFromSafeArray(_variant_t value);
+
+    _variant_t m_value;
+    unsigned int m_size = 0;
+    KestCdfNormalizedString m_swUnits;
+    KestCdfNormalizedString m_formatType;
+};
+
+}  // namespace kest

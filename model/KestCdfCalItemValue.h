@@ -1,0 +1,63 @@
+#pragma once
+// KestCdfCalItemValue: the value of one calibration item, the list a VALUE element carries
+// with its units and format type.
+
+#include "../platform/Automation.h"
+#include "../platform/XmlDom.h"
+#include "../text/KestCdfNormalizedString.h"
+
+namespace kest {
+
+class KestCdfCalItemValue {
+public:
+    /// An empty value: VT_EMPTY, empty units and format type, not read from a document.
+    KestCdfCalItemValue();
+    /// Deep copies of the value (array and elements), both strings and the from-document flag.
+    KestCdfCalItemValue(const KestCdfCalItemValue& other);
+    KestCdfCalItemValue& operator=(const KestCdfCalItemValue& other);
+    ~KestCdfCalItemValue();
+
+    /// A deep copy of the stored value (VT_EMPTY, or VT_ARRAY|VT_VARIANT).
+    _variant_t GetValue() const;
+    /// Stores a new value list according to the format type, which must be set first, and to
+    /// whether the object was read from a document: read "NUMERIC" text is split into numbers,
+    /// read quoted "STRING" text into strings; otherwise the value is kept as one element. A
+    /// value without a text form (an array) throws _com_error and changes nothing.
+    void SetValue(_variant_t value);
+
+    /// Copies of the format type and the units.
+    KestCdfNormalizedString GetFormatType() const { return m_formatType; }
+    KestCdfNormalizedString GetUnits() const { return m_units; }
+    /// Verbatim copies; the stored value is not converted again.
+    void SetFormatType(KestCdfNormalizedString formatType) { m_formatType = formatType; }
+    void SetUnits(KestCdfNormalizedString units) { m_units = units; }
+
+    /// Reads a VALUE element: its first two attributes by position (units, format type), then
+    /// the value of its last child node. Missing attributes read as "Error occured"; an
+    /// attribute node of the wrong kind throws KestCalmorphDLLError 19; an absent node or a
+    /// child without text throws _com_error. Returns true.
+    bool ConvertCalItemValueNode(IXMLDOMNodePtr node);
+    /// Reads units and format type from the first two entries of `attributes`; an absent map
+    /// changes nothing.
+    void SetCalItemValueAttributes(IXMLDOMNamedNodeMapPtr attributes);
+    /// Appends a new VALUE element (namespace `ns`) to `parent` with the attributes
+    /// sw-units-ref and format-type and the value as text. Throws KestCalmorphDLLError 29 when
+    /// the value is VT_EMPTY (the element stays attached); _com_error for an absent parent or
+    /// document. Returns true.
+    bool ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+                                      KestCdfNormalizedString ns);
+
+private:
+    _bstr_t GetNodeString(IXMLDOMNodePtr node);
+    int CountValues(_bstr_t text);
+    _variant_t PutNumbersIntoSafeArray(_variant_t value, _variant_t array);
+    void PutStringsIntoSafeArray(_variant_t value, _variant_t& array);
+    _variant_t GetNumbersFromSafeArray(_variant_t value);
+
+    _variant_t m_value;
+    KestCdfNormalizedString m_units;
+    KestCdfNormalizedString m_formatType;
+    int m_fromDocument = 0;
+};
+
+}  // namespace kest
