@@ -48,4 +48,8 @@ inline std::u16string_view BstrView(BSTR text) noexcept {
     return text ? std::u16string_view(text, SysStringLen(text)) : std::u16string_view();
 }
 
+/// Test aid for out-of-memory paths: the next `count` BSTR allocations succeed and the one
+/// after fails as if memory had run out; a negative count (the default) turns this off.
+void SysFailAllocationAfter(long count) noexcept;
+
 }  // namespace kest
