@@ -1,0 +1,236 @@
+// The converter object, the read pipeline (load, walk, convert CAL-DATA) and the write pipeline
+// (build a new document around the tree and save it).
+
+#include "KestCalmorph.h"
+
+#include <utility>
+#include <vector>
+
+namespace kest {
+
+namespace {
+
+// Element names whose subtrees the walk never enters: the change history is read by the root's
+// own reader, and calibration items can be large and hold nothing the walk looks for.
+constexpr std::u16string_view kSkippedChangeHistory = u"CHANGE-HISTORY";
+constexpr std::u16string_view kSkippedCalItem = u"CAL-ITEM";
+constexpr std::u16string_view kCalDataName = u"CAL-DATA";
+
+bool IsSkippedSubtree(const _bstr_t& name) noexcept {
+    std::u16string_view view = name.View();
+    return view == kSkippedChangeHistory || view == kSkippedCalItem;
+}
+
+// Clears the converter's write-document field and current node when a write ends, however it
+// ends, so that neither outlives the document of that call.
+class WriteScope {
+public:
+    WriteScope(IXMLDOMDocument*& document, IXMLDOMNodePtr& currentNode) noexcept
+        : m_document(document), m_currentNode(currentNode) {}
+    ~WriteScope() {
+        m_document = nullptr;
+        m_currentNode = nullptr;
+    }
+    WriteScope(const WriteScope&) = delete;
+    WriteScope& operator=(const WriteScope&) = delete;
+
+private:
+    IXMLDOMDocument*& m_document;
+    IXMLDOMNodePtr& m_currentNode;
+};
+
+}  // namespace
+
+KestCalmorph::KestCalmorph() = default;
+
+KestCalmorph::KestCalmorph(const KestCalmorph& other)
+    : m_calData(other.m_calData),
+      m_writeDocument(other.m_writeDocument),
+      m_currentNode(other.m_currentNode),
+      m_documentPointer(other.m_documentPointer) {}
+
+KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
+    if (this != &other) {
+        m_calData = other.m_calData;
+        m_writeDocument = other.m_writeDocument;
+        m_currentNode = other.m_currentNode;
+        m_documentPointer = other.m_documentPointer;
+    }
+    return *this;
+}
+
+KestCalmorph::~KestCalmorph() {
+    m_documentPointer.Release();
+    m_currentNode.Release();
+}
+
+// ---------------------------------------------------------------------------------------------
+// Reading
+
+KestCdfCalData KestCalmorph::ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CComBSTR& message) {
+    CComBSTR result = LoadXMLFile(std::move(path), IXMLDOMDocument2Ptr(), wantMessage);
+    // Assigned only once the load returned, so that an exception leaves the caller's text alone.
+    message = std::move(result);
+    return m_calData;
+}
+
+CComBSTR KestCalmorph::LoadXMLFile(CComBSTR path, IXMLDOMDocument2Ptr document, bool wantMessage) {
+    CComBSTR message(u"");
+    if (path != nullptr) {
+        HRESULT hr = document.CreateInstance(kProgIdDOMDocument40);
+        if (FAILED(hr)) throw hr;
+        document->Putasync(VARIANT_FALSE);
+
+        VARIANT_BOOL loaded = VARIANT_FALSE;
+        try {
+            loaded = document->load(_variant_t(static_cast<const OLECHAR*>(path)));
+        } catch (...) {
+            // A load that throws is a load that failed; the parse error says why.
+            loaded = VARIANT_FALSE;
+        }
+
+        if (loaded != VARIANT_FALSE) {
+            IXMLDOMParseErrorPtr parseError = document->GetparseError();
+            if (parseError->GeterrorCode() != 0) message = CComBSTR(parseError->Getreason().View());
+        } else {
+            IXMLDOMParseErrorPtr parseError = document->GetparseError();
+            if (!parseError) throw E_POINTER;
+            message = CComBSTR(parseError->Getreason().View());
+        }
+
+        // After a failed load the document is empty, so the walk converts nothing and the tree
+        // keeps what an earlier read left in it.
+        VisitCalDataNodes(IXMLDOMNodePtr(document));
+    }
+    return wantMessage ? message : CComBSTR(u"");
+}
+
+long KestCalmorph::VisitCalDataNodes(IXMLDOMNodePtr node) {
+    if (!node) return 1;
+
+    // The node's own conversion and its attributes are not guarded: their failures reach the
+    // caller as they are.
+    ConvertXMLNode(node);
+    if (IXMLDOMNamedNodeMapPtr attributes = node->Getattributes()) {
+        for (IXMLDOMNodePtr attribute = attributes->nextNode(); attribute;
+             attribute = attributes->nextNode()) {
+            ConvertXMLNode(attribute);
+        }
+    }
+
+    // Everything below the node is guarded. The walk keeps its own stack of child lists instead
+    // of recursing, so that nesting depth is limited by memory, not by the call stack; the order
+    // is the recursive one: a node, its attributes, then its children in document order.
+    try {
+        std::vector<IXMLDOMNodeListPtr> pending;
+        pending.push_back(node->GetchildNodes());
+        while (!pending.empty()) {
+            IXMLDOMNodePtr child = pending.back()->nextNode();
+            if (!child) {
+                pending.pop_back();
+                continue;
+            }
+            if (IsSkippedSubtree(child->GetnodeName())) continue;
+
+            ConvertXMLNode(child);
+            if (IXMLDOMNamedNodeMapPtr attributes = child->Getattributes()) {
+                for (IXMLDOMNodePtr attribute = attributes->nextNode(); attribute;
+                     attribute = attributes->nextNode()) {
+                    ConvertXMLNode(attribute);
+                }
+            }
+            pending.push_back(child->GetchildNodes());
+        }
+    } catch (const KestCalmorphDLLError& error) {
+        throw KestCalmorphDLLError(error);
+    } catch (...) {
+        KestCalmorphDLLError::Raise(reason::kWalkFailed);
+    }
+    return 0;
+}
+
+const OLECHAR* KestCalmorph::ConvertXMLNode(IXMLDOMNodePtr node) {
+    if (!node) throw _com_error(E_POINTER);
+    if (node->GetnodeType() == NODE_ELEMENT && node->GetnodeName().View() == kCalDataName) {
+        m_calData.SetNodeAttributes(node->Getattributes());
+        if (!m_calData.ConvertCalDataNode(node)) throw KestCalmorphDLLError();
+    }
+    return nullptr;
+}
+
+long KestCalmorph::LoadDocumentSync(IXMLDOMDocument* document, const OLECHAR* path) {
+    if (!document) return E_POINTER;
+    try {
+        document->Putasync(VARIANT_FALSE);
+    } catch (const _com_error& error) {
+        return error.Error();
+    }
+    try {
+        return document->load(_variant_t(path)) != VARIANT_FALSE ? S_OK : S_FALSE;
+    } catch (const _com_error& error) {
+        return error.Error();
+    }
+}
+
+IXMLDOMDocument2Ptr KestCalmorph::GetDocumentPointer() { return m_documentPointer; }
+
+void KestCalmorph::SetDocumentPointer(IXMLDOMDocument2Ptr document) {
+    m_documentPointer = std::move(document);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Writing
+
+KestCdfCalData KestCalmorph::ConvertCPPToXML() { return KestCdfCalData(); }
+
+bool KestCalmorph::ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment) {
+    m_calData = data;
+
+    IXMLDOMDocument2Ptr document;
+    HRESULT hr = document.CreateInstance(kProgIdDOMDocument40);
+    if (FAILED(hr)) throw hr;
+
+    WriteScope scope(m_writeDocument, m_currentNode);
+    m_writeDocument = document.GetInterfacePtr();
+    CreateXMLEnvironment();
+    // The whole tree is built before anything is saved: a writer that refuses the tree throws
+    // here, and no file is touched.
+    m_calData.ConvertCalDataNodeToXML(m_writeDocument, std::move(comment));
+    return SaveDocument(std::move(outputPath));
+}
+
+void KestCalmorph::CreateXMLEnvironment() {
+    if (!m_writeDocument) throw _com_error(E_POINTER);
+    IXMLDOMNodePtr declaration =
+        m_writeDocument->createNode(_variant_t(static_cast<int>(NODE_PROCESSING_INSTRUCTION)),
+                                    _bstr_t(u"xml"), _bstr_t(u""));
+    IXMLDOMNamedNodeMapPtr pseudoAttributes = declaration->Getattributes();
+    if (!pseudoAttributes) throw _com_error(E_POINTER);
+    IXMLDOMAttributePtr encoding = m_writeDocument->createAttribute(_bstr_t(u"encoding"));
+    encoding->PutnodeValue(_variant_t(u"UTF-8"));
+    pseudoAttributes->setNamedItem(encoding);
+    m_currentNode = declaration;
+    m_writeDocument->appendChild(declaration);
+}
+
+bool KestCalmorph::SaveDocument(CComBSTR path) {
+    if (!m_writeDocument) return false;
+    if (path.Length() == 0) return false;
+    m_writeDocument->save(_variant_t(static_cast<const OLECHAR*>(path)));
+    return true;
+}
+
+void KestCalmorph::NewXMLNodeElement(const OLECHAR* name) {
+    try {
+        if (!m_writeDocument) throw _com_error(E_POINTER);
+        IXMLDOMElementPtr element = m_writeDocument->createElement(_bstr_t(name));
+        m_currentNode->appendChild(element);
+    } catch (const _com_error& error) {
+        if (error.Error() == E_FAIL) KestCalmorphDLLError::Raise(reason::kNewElementRefused);
+        // Other DOM failures leave the document as it is.
+    } catch (...) {
+        KestCalmorphDLLError::Raise(reason::kNewElementFailed);
+    }
+}
+
+}  // namespace kest
