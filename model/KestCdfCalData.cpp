@@ -1,0 +1,174 @@
+#include "KestCdfCalData.h"
+
+#include "../core/KestCalmorphDLLError.h"
+
+namespace kest {
+namespace {
+
+IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                             const OLECHAR* name, const _bstr_t& ns) {
+    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
+                                             _bstr_t(name), ns);
+    parent->appendChild(element);
+    return element;
+}
+
+// One element holding one text node; a null text gives empty content.
+void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                       const _bstr_t& ns, BSTR text) {
+    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
+    IXMLDOMNodePtr node =
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
+    element->appendChild(node);
+}
+
+// The text of a text-only element: the last child node's value, empty (not null) without
+// children. A child without text (a nested element) throws _com_error.
+CComBSTR ElementText(const IXMLDOMNodePtr& element) {
+    CComBSTR text(std::u16string_view{});
+    IXMLDOMNodeListPtr parts = element->GetchildNodes();
+    if (!parts) return text;
+    while (IXMLDOMNodePtr part = parts->nextNode()) {
+        text = CComBSTR(_bstr_t(part->GetnodeValue()).View());
+    }
+    return text;
+}
+
+void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
+                  const OLECHAR* name, BSTR value) {
+    IXMLDOMAttributePtr attribute = doc->createAttribute(_bstr_t(name));
+    attribute->PutnodeValue(_variant_t(_bstr_t(BstrView(value))));
+    attributes->setNamedItem(attribute);
+}
+
+}  // namespace
+
+KestCdfCalList* KestCdfCalData::CreateCalList(int count) {
+    KestCdfCalList* lists = m_calLists.AllocateArray(count);
+    m_calListLength = count;
+    return lists;
+}
+
+void KestCdfCalData::SetCalLists(KestCdfCalList* lists) {
+    m_calLists.Set(lists);
+    m_calListLength = -1;
+}
+
+KestCdfCalList& KestCdfCalData::FirstList() const {
+    if (!m_calLists.get()) throw _com_error(E_POINTER);
+    if (m_calListLength == 0) throw _com_error(DISP_E_BADINDEX);
+    return m_calLists.get()[0];
+}
+
+KestCdfCalList KestCdfCalData::GetCalList() const { return FirstList(); }
+
+void KestCdfCalData::SetCalList(KestCdfCalList list) { FirstList() = list; }
+
+_bstr_t KestCdfCalData::GetNodeString(IXMLDOMNodePtr node) {
+    if (!node) KestCalmorphDLLError::Raise(reason::kCalDataAttributeMissing);
+    if (node->GetnodeType() != NODE_ATTRIBUTE) {
+        KestCalmorphDLLError::Raise(reason::kCalDataNotAttribute);
+    }
+    return _bstr_t(node->GetnodeValue());
+}
+
+void KestCdfCalData::SetNodeAttributes(IXMLDOMNamedNodeMapPtr attributes) {
+    if (!attributes) KestCalmorphDLLError::Raise(reason::kCalDataNoAttributeMap);
+    // By position, whatever the names: namespace, schema instance, schema location.
+    m_namespace = GetNodeString(attributes->nextNode());
+    m_schemaInstance = GetNodeString(attributes->nextNode());
+    m_schemaLocation = GetNodeString(attributes->nextNode());
+}
+
+int KestCdfCalData::CountCalList(IXMLDOMNodePtr node) {
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return 0;
+    int count = 0;
+    try {
+        while (IXMLDOMNodePtr child = children->nextNode()) {
+            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"CAL-LIST") {
+                ++count;
+            }
+        }
+    } catch (...) {
+        KestCalmorphDLLError::Raise(reason::kCalDataReadFailed);
+    }
+    return count;
+}
+
+void KestCdfCalData::ReadChild(IXMLDOMNodePtr child, int& listIndex) {
+    if (child->GetnodeType() != NODE_ELEMENT) return;
+    _bstr_t name = child->GetnodeName();
+    if (name == u"CHANGE-HISTORY") {
+        m_changeHistory.ConvertChangeHistoryNode(child);
+    } else if (name == u"FILENAME") {
+        m_fileName.m_string = ElementText(child);
+    } else if (name == u"COMPANY-INFO") {
+        m_company.m_string = ElementText(child);
+    } else if (name == u"NOTE") {
+        m_note = ElementText(child);
+    } else if (name == u"CAL-LIST") {
+        if (listIndex < m_calListSize) m_calLists.get()[listIndex++].ConvertCalListNode(child);
+    }
+}
+
+bool KestCdfCalData::ConvertCalDataNode(IXMLDOMNodePtr node) {
+    m_calListSize = CountCalList(node);
+    CreateCalList(m_calListSize);
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return true;
+    int listIndex = 0;
+    while (IXMLDOMNodePtr child = children->nextNode()) {
+        try {
+            ReadChild(child, listIndex);
+        } catch (KestCalmorphDLLError&) {
+            throw;
+        } catch (...) {
+            KestCalmorphDLLError::Raise(reason::kCalDataReadFailed);
+        }
+    }
+    return true;
+}
+
+bool KestCdfCalData::SetXMLAttributes(IXMLDOMNodePtr root) {
+    IXMLDOMNamedNodeMapPtr attributes = root->Getattributes();
+    if (!attributes) return false;
+    AddAttribute(m_document, attributes, u"xmlns", m_namespace.m_string);
+    if (m_schemaInstance.m_string == nullptr) {
+        KestCalmorphDLLError::Raise(reason::kSchemaInstanceMissing);
+    }
+    AddAttribute(m_document, attributes, u"xmlns:xsi", m_schemaInstance.m_string);
+    if (m_schemaLocation.m_string == nullptr) {
+        KestCalmorphDLLError::Raise(reason::kSchemaLocationMissing);
+    }
+    const bool noNamespace = m_namespace.m_string.Length() == 0;
+    AddAttribute(m_document, attributes,
+                 noNamespace ? u"xsi:noNamespaceSchemaLocation" : u"xsi:schemaLocation",
+                 m_schemaLocation.m_string);
+    return true;
+}
+
+bool KestCdfCalData::ConvertCalDataNodeToXML(IXMLDOMDocument* doc, CComBSTR comment) {
+    if (!doc) throw _com_error(E_POINTER);
+    m_document = doc;
+    IXMLDOMNodePtr root = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
+                                          _bstr_t(u"CAL-DATA"), _bstr_t(u""));
+    doc->appendChild(root);
+    if (comment.Length() != 0) root->appendChild(doc->createComment(_bstr_t(comment.View())));
+    m_changeHistory.ConvertChangeHistoryToXML(root, doc, m_namespace);
+    _bstr_t uri(m_namespace.m_string.m_str, true);
+    AppendTextElement(root, doc, u"FILENAME", uri, m_fileName.m_string);
+    if (m_company.m_string != nullptr) {
+        AppendTextElement(root, doc, u"COMPANY-INFO", uri, m_company.m_string);
+    }
+    if (m_note != nullptr) AppendTextElement(root, doc, u"NOTE", uri, m_note);
+    SetXMLAttributes(root);
+    if (m_calListSize > 0 && !m_calLists.get()) throw _com_error(E_POINTER);
+    for (int i = 0; i < m_calListSize; ++i) {
+        m_calLists.get()[i].ConvertCalListNodeToXML(root, doc, m_namespace);
+    }
+    return true;
+}
+
+}  // namespace kest

@@ -1,0 +1,126 @@
+#include "KestCdfCalItem.h"
+
+#include "../core/KestCalmorphDLLError.h"
+
+namespace kest {
+namespace {
+
+IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                             const OLECHAR* name, const _bstr_t& ns) {
+    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
+                                             _bstr_t(name), ns);
+    parent->appendChild(element);
+    return element;
+}
+
+// One element holding one text node; a null text gives empty content.
+void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                       const _bstr_t& ns, BSTR text) {
+    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
+    IXMLDOMNodePtr node =
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
+    element->appendChild(node);
+}
+
+// A node's value as owned text; an element's (null) value throws _com_error.
+CComBSTR TextOf(const IXMLDOMNodePtr& node) {
+    return CComBSTR(_bstr_t(node->GetnodeValue()).View());
+}
+
+}  // namespace
+
+KestCdfCalItemValue KestCdfCalItem::GetCalItemValue() const {
+    if (!m_value.get()) throw _com_error(E_POINTER);
+    return *m_value.get();
+}
+
+int KestCdfCalItem::CountAxisNodes(IXMLDOMNodePtr node) {
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return 0;
+    int count = 0;
+    try {
+        while (IXMLDOMNodePtr child = children->nextNode()) {
+            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"AXIS") ++count;
+        }
+    } catch (...) {
+        // -1 makes the allocation that follows fail, which the list reader reports.
+        return -1;
+    }
+    return count;
+}
+
+void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
+    if (child->GetnodeType() != NODE_ELEMENT) return;
+    _bstr_t name = child->GetnodeName();
+    if (name == u"NAME") {
+        // The last child node stands; no child gives an empty (not null) name.
+        CComBSTR text(std::u16string_view{});
+        IXMLDOMNodeListPtr parts = child->GetchildNodes();
+        if (parts) {
+            while (IXMLDOMNodePtr part = parts->nextNode()) text = TextOf(part);
+        }
+        m_name.m_string = std::move(text);
+    } else if (name == u"AXIS") {
+        if (axisIndex < m_axisSize) m_axes.get()[axisIndex++].ConvertAxisNode(child);
+    } else if (name == u"VALUE") {
+        m_value.AllocateObject()->ConvertCalItemValueNode(child);
+    } else if (name == u"ANNOTATION") {
+        // Only the first child node counts; an empty element leaves the annotation alone.
+        if (IXMLDOMNodePtr first = child->GetfirstChild()) m_annotation = TextOf(first);
+    } else if (name == u"NOTE") {
+        IXMLDOMNodePtr first = child->GetfirstChild();
+        m_note = first ? TextOf(first) : CComBSTR(std::u16string_view{});
+    }
+}
+
+bool KestCdfCalItem::ConvertCalItemNode(IXMLDOMNodePtr node) {
+    m_axisSize = CountAxisNodes(node);
+    m_axes.AllocateArray(m_axisSize);
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return true;
+    int axisIndex = 0;
+    while (IXMLDOMNodePtr child = children->nextNode()) {
+        // Whatever fails inside the item reaches the host with the item's name.
+        try {
+            ReadChild(child, axisIndex);
+        } catch (KestCalmorphDLLError& error) {
+            error.SetReasonString(m_name.m_string);
+            throw;
+        } catch (...) {
+            KestCalmorphDLLError error;
+            error.SetReason(reason::kCalItemReadFailed);
+            error.SetReasonString(m_name.m_string);
+            throw error;
+        }
+    }
+    return true;
+}
+
+void KestCdfCalItem::WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+                               const KestCdfNormalizedString& ns) {
+    if (!doc) throw _com_error(E_POINTER);
+    _bstr_t uri(ns.m_string.m_str, true);
+    IXMLDOMNodePtr item = AppendElement(parent, doc, u"CAL-ITEM", uri);
+    if (m_name.m_string == nullptr) KestCalmorphDLLError::Raise(reason::kCalItemNameMissing);
+    AppendTextElement(item, doc, u"NAME", uri, m_name.m_string);
+    if (m_axisSize > 0 && !m_axes.get()) throw _com_error(E_POINTER);
+    for (int i = 0; i < m_axisSize; ++i) m_axes.get()[i].ConvertAxisNodeToXML(item, doc, ns);
+    if (!m_value.get()) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
+    m_value.get()->ConvertCalItemValueNodeToXML(item, doc, ns);
+    if (m_annotation != nullptr) AppendTextElement(item, doc, u"ANNOTATION", uri, m_annotation);
+    if (m_note != nullptr) AppendTextElement(item, doc, u"NOTE", uri, m_note);
+}
+
+bool KestCdfCalItem::ConvertCalItemNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+                                             KestCdfNormalizedString ns) {
+    try {
+        WriteItem(parent, doc, ns);
+    } catch (KestCalmorphDLLError& error) {
+        error.SetReasonString(m_name.m_string);
+        throw;
+    }
+    return true;
+}
+
+}  // namespace kest

@@ -1,0 +1,124 @@
+#include "KestCdfCalList.h"
+
+#include "../core/KestCalmorphDLLError.h"
+
+namespace kest {
+namespace {
+
+IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                             const OLECHAR* name, const _bstr_t& ns) {
+    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
+                                             _bstr_t(name), ns);
+    parent->appendChild(element);
+    return element;
+}
+
+// One element holding one text node; a null text gives empty content.
+void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                       const _bstr_t& ns, BSTR text) {
+    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
+    IXMLDOMNodePtr node =
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
+    element->appendChild(node);
+}
+
+// A node's value as owned text; an element's (null) value throws _com_error.
+CComBSTR TextOf(const IXMLDOMNodePtr& node) {
+    return CComBSTR(_bstr_t(node->GetnodeValue()).View());
+}
+
+}  // namespace
+
+KestCdfSymbolicFile KestCdfCalList::GetSymbolicFile() const {
+    if (!m_symbolicFile.get()) throw _com_error(E_POINTER);
+    return *m_symbolicFile.get();
+}
+
+KestCdfTargetImage KestCdfCalList::GetTargetImage() const {
+    if (!m_targetImage.get()) throw _com_error(E_POINTER);
+    return *m_targetImage.get();
+}
+
+KestCdfCalItem* KestCdfCalList::CreateCalItems() {
+    if (m_calItemSize == -1) KestCalmorphDLLError::Raise(reason::kCalItemSizeUnset);
+    return m_calItems.AllocateArray(m_calItemSize);
+}
+
+int KestCdfCalList::CountCalItem(IXMLDOMNodePtr node) {
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return 0;
+    int count = 0;
+    try {
+        while (IXMLDOMNodePtr child = children->nextNode()) {
+            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"CAL-ITEM") {
+                ++count;
+            }
+        }
+    } catch (...) {
+        // -1 makes the allocation that follows fail, which the root reader reports.
+        return -1;
+    }
+    return count;
+}
+
+void KestCdfCalList::ReadChild(IXMLDOMNodePtr child, int& itemIndex) {
+    _bstr_t name = child->GetnodeName();
+    if (name == u"NAME") {
+        // Only the first child node counts; an empty element leaves the name alone.
+        if (IXMLDOMNodePtr first = child->GetfirstChild()) m_name.m_string = TextOf(first);
+    } else if (name == u"SYMBOLIC-FILE") {
+        m_symbolicFile.AllocateObject()->ConvertSymbolicFileNode(child);
+    } else if (name == u"TARGET-IMAGE") {
+        m_targetImage.AllocateObject()->ConvertTargetImageFileNode(child);
+    } else if (name == u"NOTE") {
+        // The last child node stands; no child gives an empty (not null) note.
+        CComBSTR text(std::u16string_view{});
+        IXMLDOMNodeListPtr parts = child->GetchildNodes();
+        if (parts) {
+            while (IXMLDOMNodePtr part = parts->nextNode()) text = TextOf(part);
+        }
+        m_note = std::move(text);
+    } else if (name == u"CAL-ITEM") {
+        if (itemIndex < m_calItemSize) m_calItems.get()[itemIndex++].ConvertCalItemNode(child);
+    }
+}
+
+bool KestCdfCalList::ConvertCalListNode(IXMLDOMNodePtr node) {
+    m_calItemSize = CountCalItem(node);
+    m_calItems.AllocateArray(m_calItemSize);
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return true;
+    int itemIndex = 0;
+    while (IXMLDOMNodePtr child = children->nextNode()) {
+        if (child->GetnodeType() != NODE_ELEMENT) continue;
+        try {
+            ReadChild(child, itemIndex);
+        } catch (KestCalmorphDLLError&) {
+            throw;
+        } catch (...) {
+            KestCalmorphDLLError::Raise(reason::kCalListReadFailed);
+        }
+    }
+    return true;
+}
+
+bool KestCdfCalList::ConvertCalListNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+                                             KestCdfNormalizedString ns) {
+    if (!doc) throw _com_error(E_POINTER);
+    _bstr_t uri(ns.m_string.m_str, true);
+    IXMLDOMNodePtr list = AppendElement(parent, doc, u"CAL-LIST", uri);
+    if (m_name.m_string == nullptr) KestCalmorphDLLError::Raise(reason::kCalListNameMissing);
+    AppendTextElement(list, doc, u"NAME", uri, m_name.m_string);
+    if (!m_symbolicFile.get()) KestCalmorphDLLError::Raise(reason::kSymbolicFileMissing);
+    m_symbolicFile.get()->ConvertSymbolicFileNodeToXML(list, doc, ns);
+    if (m_targetImage.get()) m_targetImage.get()->ConvertTargetImageFileNodeToXML(list, doc, ns);
+    if (m_note != nullptr) AppendTextElement(list, doc, u"NOTE", uri, m_note);
+    if (m_calItemSize > 0 && !m_calItems.get()) throw _com_error(E_POINTER);
+    for (int i = 0; i < m_calItemSize; ++i) {
+        m_calItems.get()[i].ConvertCalItemNodeToXML(list, doc, ns);
+    }
+    return true;
+}
+
+}  // namespace kest
