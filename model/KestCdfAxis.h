@@ -2,6 +2,8 @@
 // KestCdfAxis: one axis of a calibration item, the points of an AXIS element with its size,
 // units and format type.
 
+#include <string_view>
+
 #include "../platform/Automation.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
@@ -52,10 +54,13 @@ private:
     void SetAxisAttributes(IXMLDOMNamedNodeMapPtr attributes);
     unsigned int GetNodeValue(IXMLDOMNodePtr node);
     _bstr_t GetNodeString(IXMLDOMNodePtr node);
-    int CountValues(_bstr_t text);
-    _variant_t PutNumbersIntoSafeArray(_variant_t value, _variant_t array);
-    void PutStringsIntoSafeArray(_variant_t value, _variant_t& array);
-    _variant_t GetNumbersFromSafeArray(_variant_t value);
+    // The value list codec with this class's rules (see KestCdfValueListCodec.h). The text
+    // and values are passed by reference and the array by move: these run once per value of a
+    // file, and copying a whole array per call would dominate.
+    int CountValues(std::u16string_view text) const noexcept;
+    _variant_t PutNumbersIntoSafeArray(const _variant_t& value, _variant_t array) const;
+    void PutStringsIntoSafeArray(const _variant_t& value, _variant_t& array) const;
+    _variant_t GetNumbersFromSafeArray(const _variant_t& value) const;
 
     _variant_t m_value;
     unsigned int m_size = 0;

@@ -1,0 +1,185 @@
+#include "KestCdfAxis.h"
+
+#include <charconv>
+#include <climits>
+#include <cmath>
+#include <cstdint>
+#include <utility>
+
+#include "../core/KestCalmorphDLLError.h"
+#include "KestCdfValueListCodec.h"
+
+namespace kest {
+
+namespace {
+
+// The size attribute is read as a number, truncated toward zero, of which the low 32 bits are
+// kept (-1 becomes 4294967295 and is written back as -1). Numbers beyond the 64-bit range
+// saturate at its limits before the low bits are taken, so no text leads to an undefined
+// conversion.
+unsigned int SizeFromDouble(double value) noexcept {
+    constexpr double kTwoTo63 = 9223372036854775808.0;
+    std::int64_t whole;
+    if (std::isnan(value))
+        whole = 0;
+    else if (value >= kTwoTo63)
+        whole = INT64_MAX;
+    else if (value < -kTwoTo63)
+        whole = INT64_MIN;
+    else
+        whole = static_cast<std::int64_t>(value);  // truncates toward zero
+    return static_cast<unsigned int>(static_cast<std::uint64_t>(whole) & 0xFFFFFFFFu);
+}
+
+// The size as the signed 32-bit number its bits stand for.
+_bstr_t SizeText(unsigned int size) {
+    const std::int64_t signedSize =
+        size > static_cast<unsigned int>(INT_MAX) ? static_cast<std::int64_t>(size) - 0x100000000LL
+                                                  : static_cast<std::int64_t>(size);
+    char buffer[16];
+    char* end = std::to_chars(buffer, buffer + sizeof buffer, signedSize).ptr;
+    return _bstr_t(std::string(buffer, end));
+}
+
+_bstr_t TextOf(const KestCdfNormalizedString& text) {
+    return _bstr_t(BstrView(text.m_string.m_str));
+}
+
+void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
+                  const OLECHAR* name, const _bstr_t& value) {
+    IXMLDOMNodePtr attribute = doc->createAttribute(_bstr_t(name));
+    attribute->PutnodeValue(_variant_t(value));
+    attributes->setNamedItem(attribute);
+}
+
+}  // namespace
+
+KestCdfAxis::KestCdfAxis() = default;
+
+KestCdfAxis::KestCdfAxis(const KestCdfAxis& other)
+    : m_value(other.m_value),
+      m_size(other.m_size),
+      m_swUnits(other.m_swUnits),
+      m_formatType(other.m_formatType) {}
+
+KestCdfAxis& KestCdfAxis::operator=(const KestCdfAxis& other) {
+    if (this != &other) {
+        m_value = other.m_value;
+        m_size = other.m_size;
+        m_swUnits = other.m_swUnits;
+        m_formatType = other.m_formatType;
+    }
+    return *this;
+}
+
+KestCdfAxis::~KestCdfAxis() = default;
+
+_variant_t KestCdfAxis::GetAxisValue() const { return m_value; }
+
+void KestCdfAxis::SetAxisValue(_variant_t value) {
+    // Converting first means a value without a text form fails before anything changes.
+    const detail::ValueText text(value);
+    if (detail::IsFormatType(m_formatType, detail::kFormatNumeric)) {
+        _variant_t array = detail::NewValueArray(static_cast<ULONG>(CountValues(text.View())));
+        m_value = PutNumbersIntoSafeArray(value, std::move(array));
+    } else if (detail::IsFormatType(m_formatType, detail::kFormatLabel)) {
+        m_value = detail::SingleValueArray(value);
+    } else if (detail::IsFormatType(m_formatType, detail::kFormatString)) {
+        _variant_t array = detail::NewValueArray(static_cast<ULONG>(CountValues(text.View())));
+        PutStringsIntoSafeArray(value, array);
+        m_value = std::move(array);
+    }
+    // Any other format type keeps the stored value.
+}
+
+int KestCdfAxis::CountValues(std::u16string_view text) const noexcept {
+    return detail::CountValues(detail::IsFormatType(m_formatType, detail::kFormatNumeric), text);
+}
+
+_variant_t KestCdfAxis::PutNumbersIntoSafeArray(const _variant_t& value, _variant_t array) const {
+    if (value.vt == VT_BSTR) {
+        detail::FillNumbers(BstrView(value.bstrVal), detail::NumberTyping::kWholeText, array);
+        return array;
+    }
+    // A number given by the host is split as its "%.15g" text: 3.0 becomes the integer 3,
+    // 2.5 the double 2.5. Values of other kinds are taken by their numeric value.
+    char narrow[detail::kDoubleTextCapacity];
+    const char* end = detail::FormatDouble(static_cast<double>(value), narrow);
+    char16_t wide[detail::kDoubleTextCapacity];
+    std::size_t length = 0;
+    for (const char* p = narrow; p != end; ++p) wide[length++] = static_cast<char16_t>(*p);
+    detail::FillNumbers(std::u16string_view(wide, length), detail::NumberTyping::kWholeText,
+                        array);
+    return array;
+}
+
+void KestCdfAxis::PutStringsIntoSafeArray(const _variant_t& value, _variant_t& array) const {
+    if (value.vt != VT_BSTR) return;
+    detail::PutQuotedStrings(BstrView(value.bstrVal), array);
+}
+
+_variant_t KestCdfAxis::GetNumbersFromSafeArray(const _variant_t& value) const {
+    return detail::FormatValueList(value, detail::ElementWriting::kAxis);
+}
+
+bool KestCdfAxis::ConvertAxisNode(IXMLDOMNodePtr node) {
+    if (!node) throw _com_error(E_POINTER);
+    SetAxisAttributes(node->Getattributes());
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    // Every child replaces the value, so the last one decides.
+    for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
+        _variant_t text = child->GetnodeValue();
+        if (text.vt != VT_BSTR) text.ChangeType(VT_BSTR);
+        SetAxisValue(std::move(text));
+    }
+    return true;
+}
+
+void KestCdfAxis::SetAxisAttributes(IXMLDOMNamedNodeMapPtr attributes) {
+    if (!attributes) KestCalmorphDLLError::Raise(reason::kAxisNoAttributeMap);
+    // Attributes are taken by position; each member is set before the next is read.
+    m_size = GetNodeValue(attributes->nextNode());
+    m_swUnits = GetNodeString(attributes->nextNode());
+    m_formatType = GetNodeString(attributes->nextNode());
+}
+
+unsigned int KestCdfAxis::GetNodeValue(IXMLDOMNodePtr node) {
+    if (!node || node->GetnodeType() != NODE_ATTRIBUTE)
+        KestCalmorphDLLError::Raise(reason::kAxisAttributeMissing);
+    _variant_t number = node->GetnodeValue();
+    number.ChangeType(VT_R8);
+    return SizeFromDouble(number.dblVal);
+}
+
+_bstr_t KestCdfAxis::GetNodeString(IXMLDOMNodePtr node) {
+    if (!node || node->GetnodeType() != NODE_ATTRIBUTE)
+        KestCalmorphDLLError::Raise(reason::kAxisAttributeMissing);
+    return static_cast<_bstr_t>(node->GetnodeValue());
+}
+
+bool KestCdfAxis::ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+                                       KestCdfNormalizedString ns) {
+    if (!doc) throw _com_error(E_POINTER);
+    IXMLDOMNodePtr element =
+        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(u"AXIS"), TextOf(ns));
+    if (!parent) throw _com_error(E_POINTER);
+    parent->appendChild(element);
+
+    IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
+    if (!attributes) KestCalmorphDLLError::Raise(reason::kAxisWriteNoAttributeMap);
+    AddAttribute(doc, attributes, u"size", SizeText(m_size));
+    attributes = element->Getattributes();
+    AddAttribute(doc, attributes, u"sw-units", TextOf(m_swUnits));
+    AddAttribute(doc, attributes, u"format-type", TextOf(m_formatType));
+
+    // The element stays attached with its attributes when there is nothing to write.
+    if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kAxisValueEmpty);
+    const _variant_t text = GetNumbersFromSafeArray(m_value);
+    IXMLDOMNodePtr textNode =
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+    textNode->PutnodeValue(text);
+    element->appendChild(textNode);
+    return true;
+}
+
+}  // namespace kest

@@ -1,0 +1,149 @@
+#include "KestCdfCalItemValue.h"
+
+#include <utility>
+
+#include "../core/KestCalmorphDLLError.h"
+#include "KestCdfValueListCodec.h"
+
+namespace kest {
+
+namespace {
+
+_bstr_t TextOf(const KestCdfNormalizedString& text) {
+    return _bstr_t(BstrView(text.m_string.m_str));
+}
+
+void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
+                  const OLECHAR* name, const _bstr_t& value) {
+    IXMLDOMNodePtr attribute = doc->createAttribute(_bstr_t(name));
+    attribute->PutnodeValue(_variant_t(value));
+    attributes->setNamedItem(attribute);
+}
+
+}  // namespace
+
+KestCdfCalItemValue::KestCdfCalItemValue() = default;
+
+KestCdfCalItemValue::KestCdfCalItemValue(const KestCdfCalItemValue& other)
+    : m_value(other.m_value),
+      m_units(other.m_units),
+      m_formatType(other.m_formatType),
+      m_fromDocument(other.m_fromDocument) {}
+
+KestCdfCalItemValue& KestCdfCalItemValue::operator=(const KestCdfCalItemValue& other) {
+    if (this != &other) {
+        m_value = other.m_value;
+        m_units = other.m_units;
+        m_formatType = other.m_formatType;
+        m_fromDocument = other.m_fromDocument;
+    }
+    return *this;
+}
+
+KestCdfCalItemValue::~KestCdfCalItemValue() = default;
+
+_variant_t KestCdfCalItemValue::GetValue() const { return m_value; }
+
+void KestCdfCalItemValue::SetValue(_variant_t value) {
+    // Converting first means a value without a text form fails before anything changes.
+    const detail::ValueText text(value);
+    if (detail::IsFormatType(m_formatType, detail::kFormatNumeric)) {
+        // Text read from a document is split into numbers; a host's text stays one element.
+        _variant_t array = detail::NewValueArray(static_cast<ULONG>(CountValues(text.View())));
+        if (m_fromDocument)
+            array = PutNumbersIntoSafeArray(value, std::move(array));
+        else
+            PutStringsIntoSafeArray(value, array);
+        m_value = std::move(array);
+    } else if (detail::IsFormatType(m_formatType, detail::kFormatLabel) ||
+               !detail::IsQuoted(text.View())) {
+        m_value = detail::SingleValueArray(value);
+    } else if (detail::IsFormatType(m_formatType, detail::kFormatString)) {
+        _variant_t array = detail::NewValueArray(0);
+        PutStringsIntoSafeArray(value, array);
+        m_value = std::move(array);
+    }
+    // Quoted text under any other format type keeps the stored value.
+}
+
+int KestCdfCalItemValue::CountValues(std::u16string_view text) const noexcept {
+    return detail::CountValues(detail::IsFormatType(m_formatType, detail::kFormatNumeric), text);
+}
+
+_variant_t KestCdfCalItemValue::PutNumbersIntoSafeArray(const _variant_t& value,
+                                                        _variant_t array) const {
+    const detail::ValueText text(value);
+    detail::FillNumbers(text.View(), detail::NumberTyping::kPerToken, array);
+    return array;
+}
+
+void KestCdfCalItemValue::PutStringsIntoSafeArray(const _variant_t& value,
+                                                  _variant_t& array) const {
+    if (value.vt != VT_BSTR) return;
+    if (!m_fromDocument) {
+        // A host's text is kept whole, quotes included.
+        SAFEARRAYBOUND bound{1, 0};
+        ThrowIfFailed(SafeArrayRedim(array.parray, &bound));
+        const LONG index = 0;
+        ThrowIfFailed(SafeArrayPutElement(array.parray, &index, &value));
+        return;
+    }
+    detail::PutQuotedStrings(BstrView(value.bstrVal), array);
+}
+
+_variant_t KestCdfCalItemValue::GetNumbersFromSafeArray(const _variant_t& value) const {
+    return detail::FormatValueList(value, detail::ElementWriting::kCalItemValue);
+}
+
+bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {
+    if (!node) throw _com_error(E_POINTER);
+    SetCalItemValueAttributes(node->Getattributes());
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    // Every child replaces the value, so the last one decides.
+    for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
+        m_fromDocument = 1;
+        SetValue(child->GetnodeValue());
+    }
+    return true;
+}
+
+void KestCdfCalItemValue::SetCalItemValueAttributes(IXMLDOMNamedNodeMapPtr attributes) {
+    if (!attributes) return;
+    // Attributes are taken by position.
+    m_units = GetNodeString(attributes->nextNode());
+    m_formatType = GetNodeString(attributes->nextNode());
+}
+
+_bstr_t KestCdfCalItemValue::GetNodeString(IXMLDOMNodePtr node) {
+    _bstr_t result("Error occured");
+    if (!node) return result;
+    if (node->GetnodeType() != NODE_ATTRIBUTE)
+        KestCalmorphDLLError::Raise(reason::kValueNotAttribute);
+    result = static_cast<_bstr_t>(node->GetnodeValue());
+    return result;
+}
+
+bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent,
+                                                       IXMLDOMDocument* doc,
+                                                       KestCdfNormalizedString ns) {
+    if (!doc) throw _com_error(E_POINTER);
+    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
+                                             _bstr_t(u"VALUE"), TextOf(ns));
+    if (!parent) throw _com_error(E_POINTER);
+    parent->appendChild(element);
+
+    IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
+    AddAttribute(doc, attributes, u"sw-units-ref", TextOf(m_units));
+    AddAttribute(doc, attributes, u"format-type", TextOf(m_formatType));
+
+    // The element stays attached with its attributes when there is nothing to write.
+    if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
+    const _variant_t text = GetNumbersFromSafeArray(m_value);
+    IXMLDOMNodePtr textNode =
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+    textNode->PutnodeValue(text);
+    element->appendChild(textNode);
+    return true;
+}
+
+}  // namespace kest
