@@ -1,0 +1,183 @@
+#include "IXMLDOMNode.h"
+
+#include "IXMLDOMDocument.h"
+#include "IXMLDOMNamedNodeMap.h"
+#include "IXMLDOMNodeList.h"
+#include "detail/DomCollections.h"
+#include "detail/DomDocument.h"
+#include "detail/DomNames.h"
+#include "detail/XmlWriter.h"
+
+namespace kest {
+
+using detail::DomDocument;
+using detail::DomNode;
+
+namespace {
+
+_bstr_t ToBstr(std::string_view utf8) { return _bstr_t(Utf8ToUtf16(utf8)); }
+
+_variant_t NullVariant() {
+    _variant_t v;
+    v.vt = VT_NULL;
+    return v;
+}
+
+}  // namespace
+
+DOMNodeType IXMLDOMNode::GetnodeType() const { return static_cast<DOMNodeType>(m_node->type); }
+
+_bstr_t IXMLDOMNode::GetnodeName() const {
+    switch (m_node->type) {
+        case NODE_TEXT: return _bstr_t(u"#text");
+        case NODE_CDATA_SECTION: return _bstr_t(u"#cdata-section");
+        case NODE_COMMENT: return _bstr_t(u"#comment");
+        case NODE_DOCUMENT: return _bstr_t(u"#document");
+        default: return ToBstr(m_node->Name());
+    }
+}
+
+_variant_t IXMLDOMNode::GetnodeValue() const {
+    switch (m_node->type) {
+        case NODE_ATTRIBUTE:
+        case NODE_TEXT:
+        case NODE_CDATA_SECTION:
+        case NODE_COMMENT:
+            return _variant_t(ToBstr(m_node->Text()));
+        case NODE_PROCESSING_INSTRUCTION:
+            return _variant_t(ToBstr(m_node->IsDeclaration() ? detail::DeclarationText(m_node)
+                                                             : std::string(m_node->Text())));
+        default:
+            return NullVariant();
+    }
+}
+
+void IXMLDOMNode::PutnodeValue(const _variant_t& value) {
+    if (m_node->type == NODE_ELEMENT || m_node->type == NODE_DOCUMENT)
+        throw _com_error(E_FAIL, "elements and documents have no value of their own");
+    _bstr_t text = value;  // a value that cannot become text fails here
+    std::string utf8 = Utf16ToUtf8(text.View());
+    if (m_node->IsDeclaration()) {
+        detail::SetDeclarationText(*m_doc, m_node, utf8);
+    } else {
+        m_doc->SetText(m_node, utf8);
+    }
+}
+
+_bstr_t IXMLDOMNode::GetnamespaceURI() const {
+    const detail::DomName* name = m_node->name;
+    return name && name->created ? ToBstr(name->namespaceURI) : _bstr_t(u"");
+}
+
+_bstr_t IXMLDOMNode::Gettext() const {
+    if (m_node->type != NODE_ELEMENT && m_node->type != NODE_DOCUMENT) {
+        _variant_t value = GetnodeValue();
+        return value.vt == VT_BSTR ? _bstr_t(value.bstrVal, true) : _bstr_t(u"");
+    }
+    std::string text;
+    for (DomNode* n = m_node->firstChild; n; n = detail::NextInSubtree(m_node, n)) {
+        if (n->type == NODE_TEXT || n->type == NODE_CDATA_SECTION) text += n->Text();
+    }
+    return ToBstr(text);
+}
+
+_bstr_t IXMLDOMNode::Getxml() const {
+    std::string out;
+    detail::WriteXml(m_node, out);
+    return ToBstr(out);
+}
+
+IXMLDOMNodeListPtr IXMLDOMNode::GetchildNodes() const {
+    return detail::MakeChildList(m_doc, m_node);
+}
+
+IXMLDOMNamedNodeMapPtr IXMLDOMNode::Getattributes() const {
+    if (!m_node->HasAttributes()) return nullptr;
+    return detail::MakeAttributeMap(m_doc, m_node);
+}
+
+IXMLDOMNodePtr IXMLDOMNode::GetparentNode() const {
+    if (m_node->type == NODE_ATTRIBUTE) return nullptr;
+    return IXMLDOMNodePtr(m_doc, m_node->parent);
+}
+
+IXMLDOMNodePtr IXMLDOMNode::GetfirstChild() const { return IXMLDOMNodePtr(m_doc, m_node->firstChild); }
+
+IXMLDOMNodePtr IXMLDOMNode::GetlastChild() const { return IXMLDOMNodePtr(m_doc, m_node->lastChild); }
+
+IXMLDOMNodePtr IXMLDOMNode::GetnextSibling() const {
+    if (m_node->type == NODE_ATTRIBUTE) return nullptr;
+    return IXMLDOMNodePtr(m_doc, m_node->next);
+}
+
+IXMLDOMNodePtr IXMLDOMNode::GetpreviousSibling() const {
+    if (m_node->type == NODE_ATTRIBUTE) return nullptr;
+    return IXMLDOMNodePtr(m_doc, m_node->prev);
+}
+
+VARIANT_BOOL IXMLDOMNode::hasChildNodes() const {
+    return m_node->firstChild ? VARIANT_TRUE : VARIANT_FALSE;
+}
+
+IXMLDOMDocumentPtr IXMLDOMNode::GetownerDocument() const {
+    if (m_node->type == NODE_DOCUMENT) return nullptr;
+    return IXMLDOMDocumentPtr(m_doc, &m_doc->node);
+}
+
+IXMLDOMNodePtr IXMLDOMNode::appendChild(const IXMLDOMNodePtr& child) {
+    const IXMLDOMNode* handle = child.GetInterfacePtr();
+    if (!handle) throw _com_error(E_POINTER);
+    DomNode* node = DomDocument::NodeOf(handle);
+    if (DomDocument::DocumentOf(handle) != m_doc)
+        throw _com_error(E_INVALIDARG, "the node belongs to another document");
+    if (m_node->type != NODE_ELEMENT && m_node->type != NODE_DOCUMENT)
+        throw _com_error(E_INVALIDARG, "this kind of node cannot have children");
+    switch (node->type) {
+        case NODE_ELEMENT:
+        case NODE_PROCESSING_INSTRUCTION:
+        case NODE_COMMENT:
+            break;
+        case NODE_TEXT:
+        case NODE_CDATA_SECTION:
+            if (m_node->type == NODE_DOCUMENT)
+                throw _com_error(E_INVALIDARG, "text cannot be a child of the document");
+            break;
+        default:
+            throw _com_error(E_INVALIDARG, "this kind of node cannot be a child");
+    }
+    if (m_node->type == NODE_DOCUMENT && node->type == NODE_ELEMENT) {
+        for (DomNode* c = m_node->firstChild; c; c = c->next)
+            if (c->type == NODE_ELEMENT && c != node)
+                throw _com_error(E_INVALIDARG, "the document already has a root element");
+    }
+    for (DomNode* a = m_node; a; a = a->parent)
+        if (a == node) throw _com_error(E_INVALIDARG, "a node cannot be appended below itself");
+    detail::Unlink(node);
+    detail::LinkChild(m_node, node);
+    ++m_doc->generation;
+    return child;
+}
+
+IXMLDOMAttributePtr IXMLDOMElement::getAttributeNode(const _bstr_t& name) const {
+    return IXMLDOMAttributePtr(m_doc, detail::FindAttribute(m_node, Utf16ToUtf8(name.View())));
+}
+
+_variant_t IXMLDOMElement::getAttribute(const _bstr_t& name) const {
+    DomNode* a = detail::FindAttribute(m_node, Utf16ToUtf8(name.View()));
+    return a ? _variant_t(ToBstr(a->Text())) : NullVariant();
+}
+
+void IXMLDOMElement::setAttribute(const _bstr_t& name, const _variant_t& value) {
+    std::string qname = Utf16ToUtf8(name.View());
+    if (!detail::IsXmlName(qname)) throw _com_error(E_INVALIDARG, "not a valid name: " + qname);
+    _bstr_t text = value;
+    DomNode* a = detail::FindAttribute(m_node, qname);
+    if (!a) {
+        a = m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(qname));
+        detail::LinkAttribute(m_node, a);
+        ++m_doc->generation;
+    }
+    m_doc->SetText(a, Utf16ToUtf8(text.View()));
+}
+
+}  // namespace kest

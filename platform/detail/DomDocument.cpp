@@ -1,0 +1,191 @@
+#include "DomDocument.h"
+
+#include <atomic>
+#include <cstring>
+#include <limits>
+#include <new>
+
+#include "../IXMLDOMDocument.h"
+
+namespace kest {
+namespace detail {
+
+namespace {
+std::atomic<long> g_liveDocuments{0};
+constexpr std::size_t kMaxChunk = 1024 * 1024;
+}  // namespace
+
+void* Arena::Allocate(std::size_t size, std::size_t align) {
+    std::size_t pad = (align - reinterpret_cast<std::uintptr_t>(m_cursor) % align) % align;
+    if (!m_cursor || pad + size > m_left) {
+        // Large blocks get a chunk of their own so that the current chunk keeps its room.
+        if (size + align > m_nextChunk / 4) {
+            std::unique_ptr<char[]> block(new char[size + align]);
+            char* p = block.get();
+            m_footprint += size + align;
+            m_chunks.push_back(std::move(block));
+            std::size_t off = (align - reinterpret_cast<std::uintptr_t>(p) % align) % align;
+            return p + off;
+        }
+        std::unique_ptr<char[]> chunk(new char[m_nextChunk]);
+        m_cursor = chunk.get();
+        m_left = m_nextChunk;
+        m_footprint += m_nextChunk;
+        m_chunks.push_back(std::move(chunk));
+        if (m_nextChunk < kMaxChunk) m_nextChunk *= 2;
+        pad = (align - reinterpret_cast<std::uintptr_t>(m_cursor) % align) % align;
+    }
+    char* result = m_cursor + pad;
+    m_cursor += pad + size;
+    m_left -= pad + size;
+    return result;
+}
+
+const char* Arena::Copy(std::string_view text) {
+    if (text.empty()) return "";
+    char* p = static_cast<char*>(Allocate(text.size(), 1));
+    std::memcpy(p, text.data(), text.size());
+    return p;
+}
+
+DomDocument::DomDocument() {
+    node.type = NODE_DOCUMENT;
+    stores.push_back(std::make_unique<DomStore>());
+    g_liveDocuments.fetch_add(1, std::memory_order_relaxed);
+}
+
+DomDocument::~DomDocument() { g_liveDocuments.fetch_sub(1, std::memory_order_relaxed); }
+
+const DomName* DomStore::Intern(std::string_view qname, std::string_view namespaceURI,
+                                bool created) {
+    // Key: flag, namespace, NUL, qualified name. A namespace URI read from XML has no NUL.
+    key.clear();
+    key.reserve(qname.size() + namespaceURI.size() + 2);
+    key.push_back(created ? '1' : '0');
+    key.append(namespaceURI);
+    key.push_back('\0');
+    key.append(qname);
+    auto it = names.find(key);
+    if (it != names.end()) return it->second;
+    const char* stored = arena.Copy(key);
+    std::string_view storedKey(stored, key.size());
+    auto* name = new (arena.Allocate(sizeof(DomName), alignof(DomName))) DomName();
+    name->namespaceURI = storedKey.substr(1, namespaceURI.size());
+    name->qname = storedKey.substr(namespaceURI.size() + 2);
+    name->created = created;
+    std::size_t colon = name->qname.find(':');
+    name->prefixLength =
+        (colon != std::string_view::npos && colon > 0) ? static_cast<std::uint32_t>(colon) : 0;
+    names.emplace(storedKey, name);
+    return name;
+}
+
+DomNode* DomStore::NewNode(DOMNodeType type, const DomName* name) {
+    auto* n = new (arena.Allocate(sizeof(DomNode), alignof(DomNode))) DomNode();
+    n->type = static_cast<std::uint8_t>(type);
+    n->name = name;
+    n->text = "";
+    return n;
+}
+
+void DomStore::SetText(DomNode* n, std::string_view text) {
+    if (text.size() > std::numeric_limits<std::uint32_t>::max()) throw std::bad_alloc();
+    n->text = arena.Copy(text);
+    n->textLength = static_cast<std::uint32_t>(text.size());
+}
+
+void DomDocument::Clear() {
+    for (DomNode* child = node.firstChild; child;) {
+        DomNode* next = child->next;
+        child->parent = child->prev = child->next = nullptr;
+        child = next;
+    }
+    node.firstChild = node.lastChild = nullptr;
+    ++generation;
+    if (refs == 1) {
+        // Only the caller's document pointer is left: no node of the old content is reachable.
+        stores.clear();
+        stores.push_back(std::make_unique<DomStore>());
+    }
+}
+
+void DomDocument::Install(std::unique_ptr<DomStore> store, DomNode* top) {
+    Clear();
+    if (refs == 1) stores.clear();
+    stores.push_back(std::move(store));
+    for (DomNode* child = top->firstChild; child; child = child->next) child->parent = &node;
+    node.firstChild = top->firstChild;
+    node.lastChild = top->lastChild;
+    top->firstChild = top->lastChild = nullptr;
+}
+
+long DomDocument::EffectiveMaxDepth() const noexcept {
+    return maxElementDepth > 0 ? maxElementDepth : kDefaultMaxElementDepth;
+}
+
+void LinkChild(DomNode* parent, DomNode* child) noexcept {
+    child->parent = parent;
+    child->next = nullptr;
+    child->prev = parent->lastChild;
+    if (parent->lastChild)
+        parent->lastChild->next = child;
+    else
+        parent->firstChild = child;
+    parent->lastChild = child;
+}
+
+void LinkAttribute(DomNode* owner, DomNode* attribute) noexcept {
+    attribute->parent = owner;
+    attribute->next = nullptr;
+    DomNode* last = owner->firstAttribute;
+    while (last && last->next) last = last->next;
+    attribute->prev = last;
+    if (last)
+        last->next = attribute;
+    else
+        owner->firstAttribute = attribute;
+}
+
+void Unlink(DomNode* n) noexcept {
+    DomNode* parent = n->parent;
+    if (!parent) return;
+    if (n->type == NODE_ATTRIBUTE) {
+        if (n->prev)
+            n->prev->next = n->next;
+        else
+            parent->firstAttribute = n->next;
+        if (n->next) n->next->prev = n->prev;
+    } else {
+        if (n->prev)
+            n->prev->next = n->next;
+        else
+            parent->firstChild = n->next;
+        if (n->next)
+            n->next->prev = n->prev;
+        else
+            parent->lastChild = n->prev;
+    }
+    n->parent = n->prev = n->next = nullptr;
+}
+
+DomNode* FindAttribute(const DomNode* owner, std::string_view qname) noexcept {
+    for (DomNode* a = owner->firstAttribute; a; a = a->next)
+        if (a->Name() == qname) return a;
+    return nullptr;
+}
+
+long LiveDocuments() noexcept { return g_liveDocuments.load(std::memory_order_relaxed); }
+
+void DomAddRef(DomDocument* document) noexcept { ++document->refs; }
+
+void DomRelease(DomDocument* document) noexcept {
+    if (--document->refs == 0) delete document;
+}
+
+}  // namespace detail
+
+bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept {
+    return node && node->type == type;
+}
+
+}  // namespace kest

@@ -1,0 +1,172 @@
+#pragma once
+// The node store behind the DOM interfaces: one arena per document holds every node and every
+// string, so building is a bump allocation and freeing a document drops a few large chunks.
+// Nodes are trivially destructible; nothing in the store recurses.
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "../IXMLDOMNode.h"
+#include "../IXMLDOMSchemaCollection.h"
+
+namespace kest {
+namespace detail {
+
+/// Chunked bump allocator. Memory is returned only when the arena dies.
+class Arena {
+public:
+    Arena() = default;
+    Arena(const Arena&) = delete;
+    Arena& operator=(const Arena&) = delete;
+
+    void* Allocate(std::size_t size, std::size_t align = alignof(std::max_align_t));
+    /// Copies `text` into the arena; the copy is not zero-terminated.
+    const char* Copy(std::string_view text);
+    /// Bytes held by the arena's chunks.
+    std::size_t Footprint() const noexcept { return m_footprint; }
+
+private:
+    std::vector<std::unique_ptr<char[]>> m_chunks;
+    char* m_cursor = nullptr;
+    std::size_t m_left = 0;
+    std::size_t m_nextChunk = 16 * 1024;
+    std::size_t m_footprint = 0;
+};
+
+/// An interned qualified name together with the namespace a node was created in.
+struct DomName {
+    std::string_view qname;
+    std::string_view namespaceURI;
+    /// True for names of nodes made through createNode/createElement/createAttribute: the saver
+    /// then declares namespaceURI where it is not in scope. Parsed names are written as they are.
+    bool created = false;
+    /// Length of the prefix before ':' (0 when none).
+    std::uint32_t prefixLength = 0;
+    std::string_view Prefix() const noexcept { return qname.substr(0, prefixLength); }
+    std::string_view LocalName() const noexcept {
+        return prefixLength ? qname.substr(prefixLength + 1) : qname;
+    }
+};
+
+struct DomNode {
+    DomNode* parent = nullptr;  // for an attribute: its owner element or declaration
+    DomNode* firstChild = nullptr;
+    DomNode* lastChild = nullptr;
+    DomNode* prev = nullptr;
+    DomNode* next = nullptr;
+    DomNode* firstAttribute = nullptr;  // elements and the XML declaration only
+    const DomName* name = nullptr;      // null for text, CDATA, comment, document
+    const char* text = nullptr;         // UTF-8 value of leaves, not zero-terminated
+    std::uint32_t textLength = 0;
+    std::uint8_t type = NODE_INVALID;
+
+    std::string_view Text() const noexcept { return std::string_view(text, textLength); }
+    std::string_view Name() const noexcept { return name ? name->qname : std::string_view(); }
+    bool IsDeclaration() const noexcept {
+        return type == NODE_PROCESSING_INSTRUCTION && name && name->qname == "xml";
+    }
+    bool HasAttributes() const noexcept { return type == NODE_ELEMENT || IsDeclaration(); }
+};
+static_assert(std::is_trivially_destructible<DomNode>::value, "nodes are freed with the arena");
+
+/// Details of the last load or validation.
+struct DomError {
+    HRESULT code = S_OK;
+    std::string reason;
+    std::string url;
+    long line = 0;
+    long linepos = 0;
+    long filepos = 0;
+    std::string srcText;
+};
+
+/// Memory of one generation of content: nodes, strings and the names they use.
+struct DomStore {
+    Arena arena;
+    std::unordered_map<std::string_view, const DomName*> names;
+    /// Short whitespace texts (indentation) are stored once.
+    std::unordered_map<std::string_view, const char*> blanks;
+    std::string key;  // scratch for Intern
+
+    const DomName* Intern(std::string_view qname, std::string_view namespaceURI = {},
+                          bool created = false);
+    DomNode* NewNode(DOMNodeType type, const DomName* name = nullptr);
+    void SetText(DomNode* node, std::string_view text);
+};
+
+struct DomDocument {
+    DomDocument();
+    ~DomDocument();
+    DomDocument(const DomDocument&) = delete;
+    DomDocument& operator=(const DomDocument&) = delete;
+
+    long refs = 1;  // one thread per document: no atomics needed
+    DomNode node;   // the document node itself
+    /// Every store whose nodes may still be referenced; the last one takes new nodes. A reload
+    /// keeps older stores while anything but the one document pointer refers to the document.
+    std::vector<std::unique_ptr<DomStore>> stores;
+    /// Bumped by every change of structure, so cached list positions can tell they are stale.
+    std::uint64_t generation = 0;
+
+    bool async = true;
+    bool validateOnParse = true;
+    bool serverHttpRequest = false;
+    long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
+    ComPtr<IXMLDOMSchemaCollection> schemas;
+    DomError error;
+    std::string url;  // where the current content was loaded from
+
+    /// The node and document behind an interface handle (null for null).
+    static DomNode* NodeOf(const IXMLDOMNode* handle) noexcept {
+        return handle ? handle->m_node : nullptr;
+    }
+    static DomDocument* DocumentOf(const IXMLDOMNode* handle) noexcept {
+        return handle ? handle->m_doc : nullptr;
+    }
+
+    DomStore& Store() { return *stores.back(); }
+    /// The interned name for (qname, namespace, created).
+    const DomName* Intern(std::string_view qname, std::string_view namespaceURI = {},
+                          bool created = false) {
+        return Store().Intern(qname, namespaceURI, created);
+    }
+    /// A new unattached node of this document.
+    DomNode* NewNode(DOMNodeType type, const DomName* name = nullptr) {
+        return Store().NewNode(type, name);
+    }
+    void SetText(DomNode* n, std::string_view text) { Store().SetText(n, text); }
+    /// Drops the current content. Detached nodes stay readable while referenced; when nothing
+    /// but one document pointer refers to the document, their memory is returned.
+    void Clear();
+    /// Replaces the content with the children of `top`, all allocated in `store`.
+    void Install(std::unique_ptr<DomStore> store, DomNode* top);
+    long EffectiveMaxDepth() const noexcept;
+};
+
+/// Appends `child` (unattached) as the last child of `parent`.
+void LinkChild(DomNode* parent, DomNode* child) noexcept;
+/// Detaches a node from its parent (children and attributes alike).
+void Unlink(DomNode* node) noexcept;
+/// Appends an unattached attribute to an element or declaration.
+void LinkAttribute(DomNode* owner, DomNode* attribute) noexcept;
+DomNode* FindAttribute(const DomNode* owner, std::string_view qname) noexcept;
+/// The next node of `root`'s subtree in document order (attributes excluded), or null.
+inline DomNode* NextInSubtree(const DomNode* root, DomNode* node) noexcept {
+    if (node->firstChild) return node->firstChild;
+    while (node != root) {
+        if (node->next) return node->next;
+        node = node->parent;
+    }
+    return nullptr;
+}
+
+/// Number of documents alive in this process (for leak checks in tests).
+long LiveDocuments() noexcept;
+
+}  // namespace detail
+}  // namespace kest

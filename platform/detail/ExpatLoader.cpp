@@ -1,0 +1,282 @@
+#include "ExpatLoader.h"
+
+#include <expat.h>
+
+#include <algorithm>
+#include <new>
+#include <vector>
+
+namespace kest {
+namespace detail {
+
+namespace {
+
+constexpr std::size_t kFeedChunk = 256 * 1024;
+constexpr std::size_t kMaxSharedBlank = 64;
+
+struct Builder {
+    XML_Parser parser = nullptr;
+    DomStore* store = nullptr;
+    DomNode* top = nullptr;
+    DomNode* current = nullptr;
+    long depth = 0;
+    long maxDepth = 0;
+    int doctypeDepth = 0;
+    bool inCdata = false;
+    std::string text;  // character data not yet turned into a node
+
+    // Why the build stopped the parser, when it did.
+    std::string failure;
+    long failLine = 0;
+    long failColumn = 0;
+    long failByte = 0;
+
+    void Stop(std::string why) {
+        if (failure.empty()) {
+            failure = std::move(why);
+            failLine = static_cast<long>(XML_GetCurrentLineNumber(parser));
+            failColumn = static_cast<long>(XML_GetCurrentColumnNumber(parser)) + 1;
+            failByte = static_cast<long>(XML_GetCurrentByteIndex(parser));
+        }
+        XML_StopParser(parser, XML_FALSE);
+    }
+
+    void Flush() {
+        if (text.empty()) return;
+        DomNode* node = store->NewNode(NODE_TEXT);
+        if (text.size() <= kMaxSharedBlank &&
+            text.find_first_not_of(" \t\r\n") == std::string::npos) {
+            // Indentation repeats all over a document: keep one copy of each run.
+            auto it = store->blanks.find(text);
+            if (it == store->blanks.end()) {
+                const char* stored = store->arena.Copy(text);
+                it = store->blanks.emplace(std::string_view(stored, text.size()), stored).first;
+            }
+            node->text = it->second;
+            node->textLength = static_cast<std::uint32_t>(text.size());
+        } else {
+            store->SetText(node, text);
+        }
+        LinkChild(current, node);
+        text.clear();
+    }
+};
+
+template <class F>
+void Guard(void* data, F&& body) {
+    auto* b = static_cast<Builder*>(data);
+    if (!b->failure.empty()) return;  // expat may still call a handler after a stop
+    try {
+        body(*b);
+    } catch (const std::bad_alloc&) {
+        b->Stop("out of memory");
+    } catch (...) {
+        b->Stop("internal error while building the document");
+    }
+}
+
+void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
+    Guard(data, [&](Builder& b) {
+        b.Flush();
+        if (++b.depth > b.maxDepth) {
+            b.Stop("element nesting deeper than " + std::to_string(b.maxDepth));
+            return;
+        }
+        DomNode* element = b.store->NewNode(NODE_ELEMENT, b.store->Intern(name));
+        DomNode* lastAttribute = nullptr;
+        for (const XML_Char** a = atts; *a; a += 2) {
+            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(a[0]));
+            b.store->SetText(attribute, a[1]);
+            attribute->parent = element;
+            attribute->prev = lastAttribute;
+            if (lastAttribute)
+                lastAttribute->next = attribute;
+            else
+                element->firstAttribute = attribute;
+            lastAttribute = attribute;
+        }
+        LinkChild(b.current, element);
+        b.current = element;
+    });
+}
+
+void XMLCALL OnEnd(void* data, const XML_Char*) {
+    Guard(data, [&](Builder& b) {
+        b.Flush();
+        --b.depth;
+        b.current = b.current->parent;
+    });
+}
+
+void XMLCALL OnCharacters(void* data, const XML_Char* s, int len) {
+    Guard(data, [&](Builder& b) { b.text.append(s, static_cast<std::size_t>(len)); });
+}
+
+void XMLCALL OnCdataStart(void* data) {
+    Guard(data, [&](Builder& b) {
+        b.Flush();
+        b.inCdata = true;
+    });
+}
+
+void XMLCALL OnCdataEnd(void* data) {
+    Guard(data, [&](Builder& b) {
+        DomNode* node = b.store->NewNode(NODE_CDATA_SECTION);
+        b.store->SetText(node, b.text);
+        b.text.clear();
+        LinkChild(b.current, node);
+        b.inCdata = false;
+    });
+}
+
+void XMLCALL OnComment(void* data, const XML_Char* s) {
+    Guard(data, [&](Builder& b) {
+        if (b.doctypeDepth > 0) return;  // part of the DTD, not of the document
+        b.Flush();
+        DomNode* node = b.store->NewNode(NODE_COMMENT);
+        b.store->SetText(node, s);
+        LinkChild(b.current, node);
+    });
+}
+
+void XMLCALL OnPI(void* data, const XML_Char* target, const XML_Char* pidata) {
+    Guard(data, [&](Builder& b) {
+        if (b.doctypeDepth > 0) return;
+        b.Flush();
+        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.store->Intern(target));
+        b.store->SetText(node, pidata ? pidata : "");
+        LinkChild(b.current, node);
+    });
+}
+
+void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* encoding,
+                       int standalone) {
+    Guard(data, [&](Builder& b) {
+        if (!version || b.current != b.top) return;  // a text declaration of an entity
+        DomNode* decl = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.store->Intern("xml"));
+        auto add = [&](const char* name, std::string_view value) {
+            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(name));
+            b.store->SetText(attribute, value);
+            LinkAttribute(decl, attribute);
+        };
+        add("version", version);
+        if (encoding) add("encoding", encoding);
+        if (standalone >= 0) add("standalone", standalone ? "yes" : "no");
+        LinkChild(b.current, decl);
+    });
+}
+
+void XMLCALL OnDoctypeStart(void* data, const XML_Char*, const XML_Char*, const XML_Char*, int) {
+    static_cast<Builder*>(data)->doctypeDepth++;
+}
+
+void XMLCALL OnDoctypeEnd(void* data) { static_cast<Builder*>(data)->doctypeDepth--; }
+
+// The first line of text at `offset`, for the parse error's srcText. Only for byte-oriented
+// encodings; UTF-16 input would not split on '\n' bytes.
+std::string LineAt(std::string_view bytes, long offset) {
+    if (offset < 0 || static_cast<std::size_t>(offset) > bytes.size()) return {};
+    if (bytes.size() >= 2 && ((static_cast<unsigned char>(bytes[0]) == 0xFF &&
+                               static_cast<unsigned char>(bytes[1]) == 0xFE) ||
+                              (static_cast<unsigned char>(bytes[0]) == 0xFE &&
+                               static_cast<unsigned char>(bytes[1]) == 0xFF)))
+        return {};
+    std::size_t pos = static_cast<std::size_t>(offset);
+    std::size_t begin = bytes.rfind('\n', pos == 0 ? 0 : pos - 1);
+    begin = (begin == std::string_view::npos || pos == 0) ? 0 : begin + 1;
+    if (begin > pos) begin = pos;
+    std::size_t end = bytes.find('\n', pos);
+    if (end == std::string_view::npos) end = bytes.size();
+    constexpr std::size_t kMax = 200;
+    if (end - begin > kMax) {
+        begin = pos > kMax / 2 ? std::max(begin, pos - kMax / 2) : begin;
+        end = std::min(end, begin + kMax);
+    }
+    std::string line(bytes.substr(begin, end - begin));
+    if (!line.empty() && line.back() == '\r') line.pop_back();
+    return line;
+}
+
+}  // namespace
+
+std::string DescribeLocation(const std::string& what, long line, long column,
+                             const std::string& url) {
+    std::string s = what + " at line " + std::to_string(line) + ", column " +
+                    std::to_string(column);
+    if (!url.empty()) s += " in " + url;
+    return s;
+}
+
+ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const std::string& url,
+                       long maxElementDepth, DomError& error) noexcept {
+    ParsedContent result;
+    error = DomError();
+    error.url = url;
+    XML_Parser parser = nullptr;
+    try {
+        result.store = std::make_unique<DomStore>();
+        result.top = result.store->NewNode(NODE_DOCUMENT);
+        parser = XML_ParserCreate(forcedEncoding);
+        if (!parser) throw std::bad_alloc();
+
+        Builder b;
+        b.parser = parser;
+        b.store = result.store.get();
+        b.top = b.current = result.top;
+        b.maxDepth = maxElementDepth;
+        XML_SetUserData(parser, &b);
+        XML_SetElementHandler(parser, OnStart, OnEnd);
+        XML_SetCharacterDataHandler(parser, OnCharacters);
+        XML_SetCdataSectionHandler(parser, OnCdataStart, OnCdataEnd);
+        XML_SetCommentHandler(parser, OnComment);
+        XML_SetProcessingInstructionHandler(parser, OnPI);
+        XML_SetXmlDeclHandler(parser, OnXmlDecl);
+        XML_SetDoctypeDeclHandler(parser, OnDoctypeStart, OnDoctypeEnd);
+        // No external entity handler is installed and parameter entities are never parsed:
+        // nothing outside the given bytes is ever read.
+        XML_SetParamEntityParsing(parser, XML_PARAM_ENTITY_PARSING_NEVER);
+
+        std::size_t offset = 0;
+        XML_Status status = XML_STATUS_OK;
+        do {
+            std::size_t n = std::min(kFeedChunk, bytes.size() - offset);
+            bool last = offset + n == bytes.size();
+            status = XML_Parse(parser, bytes.data() + offset, static_cast<int>(n), last);
+            offset += n;
+            if (last) break;
+        } while (status == XML_STATUS_OK);
+
+        if (status != XML_STATUS_OK || !b.failure.empty()) {
+            error.code = XML_E_PARSEFAILED;
+            std::string what;
+            if (!b.failure.empty()) {
+                what = b.failure;
+                error.line = b.failLine;
+                error.linepos = b.failColumn;
+                error.filepos = b.failByte;
+            } else {
+                XML_Error code = XML_GetErrorCode(parser);
+                what = XML_ErrorString(code) ? XML_ErrorString(code) : "parse error";
+                error.line = static_cast<long>(XML_GetCurrentLineNumber(parser));
+                error.linepos = static_cast<long>(XML_GetCurrentColumnNumber(parser)) + 1;
+                error.filepos = static_cast<long>(XML_GetCurrentByteIndex(parser));
+                if (bytes.empty()) what = "no element found (the document is empty)";
+            }
+            error.reason = DescribeLocation(what, error.line, error.linepos, url);
+            error.srcText = LineAt(bytes, error.filepos);
+            XML_ParserFree(parser);
+            return ParsedContent();
+        }
+        XML_ParserFree(parser);
+        return result;
+    } catch (...) {
+        if (parser) XML_ParserFree(parser);
+        error.code = E_OUTOFMEMORY;
+        error.reason = "out of memory while loading";
+        if (!url.empty()) error.reason += " " + url;
+        return ParsedContent();
+    }
+}
+
+}  // namespace detail
+}  // namespace kest

@@ -1,0 +1,235 @@
+#include "XmlWriter.h"
+
+#include <vector>
+
+namespace kest {
+namespace detail {
+
+namespace {
+
+constexpr std::string_view kXmlNamespace = "http://www.w3.org/XML/1998/namespace";
+
+void AppendCharRef(std::string& out, unsigned char c) {
+    out += "&#";
+    out += std::to_string(static_cast<unsigned>(c));
+    out += ';';
+}
+
+// Writes text, escaping what must not appear raw. `attribute` selects the attribute rules.
+void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
+    std::size_t run = 0;
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        unsigned char c = static_cast<unsigned char>(text[i]);
+        const char* replacement = nullptr;
+        switch (c) {
+            case '&': replacement = "&amp;"; break;
+            case '<': replacement = "&lt;"; break;
+            case '>': replacement = "&gt;"; break;
+            case '"': replacement = attribute ? "&quot;" : nullptr; break;
+            case '\r': replacement = "&#13;"; break;
+            case '\n': replacement = attribute ? "&#10;" : nullptr; break;
+            case '\t': replacement = attribute ? "&#9;" : nullptr; break;
+            default:
+                if (c < 0x20) {
+                    out.append(text.data() + run, i - run);
+                    AppendCharRef(out, c);
+                    run = i + 1;
+                }
+                continue;
+        }
+        if (!replacement) continue;
+        out.append(text.data() + run, i - run);
+        out += replacement;
+        run = i + 1;
+    }
+    out.append(text.data() + run, text.size() - run);
+}
+
+void AppendAttribute(std::string& out, std::string_view name, std::string_view value) {
+    out += ' ';
+    out += name;
+    out += "=\"";
+    AppendEscaped(out, value, true);
+    out += '"';
+}
+
+void AppendCdata(std::string& out, std::string_view text) {
+    out += "<![CDATA[";
+    std::size_t run = 0;
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        if (text[i] == '\r') {
+            // A raw CR would read back as LF.
+            out.append(text.data() + run, i - run);
+            out += "]]>&#13;<![CDATA[";
+            run = i + 1;
+        } else if (text.compare(i, 3, "]]>") == 0) {
+            out.append(text.data() + run, i + 2 - run);
+            out += "]]><![CDATA[";
+            run = i + 2;
+        }
+    }
+    out.append(text.data() + run, text.size() - run);
+    out += "]]>";
+}
+
+void AppendComment(std::string& out, std::string_view text) {
+    out += "<!--";
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        out += text[i];
+        if (text[i] == '-' && (i + 1 == text.size() || text[i + 1] == '-')) out += ' ';
+    }
+    out += "-->";
+}
+
+bool IsUtf8Name(std::string_view encoding) {
+    std::string lower;
+    for (char c : encoding) lower += static_cast<char>(c >= 'A' && c <= 'Z' ? c + 32 : c);
+    return lower == "utf-8" || lower == "utf8";
+}
+
+void AppendPI(std::string& out, const DomNode* node) {
+    out += "<?";
+    out += node->Name();
+    if (node->IsDeclaration() && node->firstAttribute) {
+        const DomNode* version = FindAttribute(node, "version");
+        AppendAttribute(out, "version", version ? version->Text() : "1.0");
+        for (const DomNode* a = node->firstAttribute; a; a = a->next) {
+            if (a == version) continue;
+            if (a->Name() == "encoding" && !IsUtf8Name(a->Text()))
+                AppendAttribute(out, "encoding", "UTF-8");
+            else
+                AppendAttribute(out, a->Name(), a->Text());
+        }
+        out += "?>";
+        return;
+    }
+    std::string_view data = node->Text();
+    if (!data.empty()) out += ' ';
+    std::size_t run = 0;
+    for (std::size_t i = 0; i + 1 < data.size(); ++i) {
+        if (data[i] == '?' && data[i + 1] == '>') {
+            out.append(data.data() + run, i + 1 - run);
+            out += ' ';
+            run = i + 1;
+        }
+    }
+    out.append(data.data() + run, data.size() - run);
+    out += "?>";
+}
+
+// In-scope namespace bindings of the elements being written; prefix "" is the default.
+class Scope {
+public:
+    std::size_t Mark() const noexcept { return m_bindings.size(); }
+    void Pop(std::size_t mark) { m_bindings.resize(mark); }
+    void Bind(std::string_view prefix, std::string_view uri) { m_bindings.push_back({prefix, uri}); }
+    /// The URI bound to `prefix`; `bound` false when the prefix is not declared.
+    std::string_view Lookup(std::string_view prefix, bool& bound) const {
+        for (auto it = m_bindings.rbegin(); it != m_bindings.rend(); ++it)
+            if (it->first == prefix) {
+                bound = true;
+                return it->second;
+            }
+        bound = prefix.empty() || prefix == "xml";
+        return prefix == "xml" ? kXmlNamespace : std::string_view();
+    }
+    bool DeclaredSince(std::size_t mark, std::string_view prefix) const {
+        for (std::size_t i = mark; i < m_bindings.size(); ++i)
+            if (m_bindings[i].first == prefix) return true;
+        return false;
+    }
+
+private:
+    std::vector<std::pair<std::string_view, std::string_view>> m_bindings;
+};
+
+// Writes the start tag of `element`; returns the scope mark to restore at its end.
+std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scope) {
+    std::size_t mark = scope.Mark();
+    out += '<';
+    out += element->Name();
+    for (const DomNode* a = element->firstAttribute; a; a = a->next) {
+        std::string_view name = a->Name();
+        if (name == "xmlns")
+            scope.Bind("", a->Text());
+        else if (name.substr(0, 6) == "xmlns:")
+            scope.Bind(name.substr(6), a->Text());
+    }
+    auto declare = [&](const DomName* n, bool isElement) {
+        if (!n || !n->created) return;
+        std::string_view prefix = n->Prefix();
+        if (!isElement && (prefix.empty() || prefix == "xmlns")) return;  // no namespace
+        if (n->qname == "xmlns" || prefix == "xml") return;
+        if (scope.DeclaredSince(mark, prefix)) return;  // an explicit declaration wins
+        bool bound = false;
+        std::string_view current = scope.Lookup(prefix, bound);
+        if (bound && current == n->namespaceURI) return;
+        if (!prefix.empty() && n->namespaceURI.empty()) return;  // cannot undeclare a prefix
+        std::string attribute = prefix.empty() ? "xmlns" : "xmlns:" + std::string(prefix);
+        AppendAttribute(out, attribute, n->namespaceURI);
+        scope.Bind(prefix, n->namespaceURI);
+    };
+    declare(element->name, true);
+    for (const DomNode* a = element->firstAttribute; a; a = a->next) declare(a->name, false);
+    for (const DomNode* a = element->firstAttribute; a; a = a->next)
+        AppendAttribute(out, a->Name(), a->Text());
+    return mark;
+}
+
+void AppendLeaf(std::string& out, const DomNode* node) {
+    switch (node->type) {
+        case NODE_TEXT: AppendEscaped(out, node->Text(), false); break;
+        case NODE_CDATA_SECTION: AppendCdata(out, node->Text()); break;
+        case NODE_COMMENT: AppendComment(out, node->Text()); break;
+        case NODE_PROCESSING_INSTRUCTION: AppendPI(out, node); break;
+        case NODE_ATTRIBUTE: AppendAttribute(out, node->Name(), node->Text()); break;
+        default: break;
+    }
+}
+
+void AppendSubtree(std::string& out, const DomNode* root) {
+    Scope scope;
+    std::vector<std::size_t> marks;
+    const DomNode* node = root;
+    for (;;) {
+        if (node->type == NODE_ELEMENT) {
+            std::size_t mark = AppendStartTag(out, node, scope);
+            if (node->firstChild) {
+                out += '>';
+                marks.push_back(mark);
+                node = node->firstChild;
+                continue;
+            }
+            out += "/>";
+            scope.Pop(mark);
+        } else {
+            AppendLeaf(out, node);
+        }
+        while (node != root && !node->next) {
+            node = node->parent;
+            out += "</";
+            out += node->Name();
+            out += '>';
+            scope.Pop(marks.back());
+            marks.pop_back();
+        }
+        if (node == root) return;
+        node = node->next;
+    }
+}
+
+}  // namespace
+
+void WriteXml(const DomNode* node, std::string& out) {
+    if (node->type != NODE_DOCUMENT) {
+        AppendSubtree(out, node);
+        return;
+    }
+    for (const DomNode* child = node->firstChild; child; child = child->next) {
+        AppendSubtree(out, child);
+        out += '\n';
+    }
+}
+
+}  // namespace detail
+}  // namespace kest

@@ -1,0 +1,26 @@
+#pragma once
+// Serialises DOM content as UTF-8 XML text.
+//
+// What is written reads back to the same values: text escapes & < > and CR; attribute values
+// escape & < > " and TAB, LF, CR; CDATA sections are split around "]]>" and CR. Nodes made
+// with a namespace URI are declared through the in-scope default namespace (or their prefix)
+// only where the URI is not already in scope; parsed nodes are written as they are, and an
+// explicit xmlns attribute on an element always wins. Where XML has no way to write a value
+// faithfully the text is made well-formed instead: "--" inside a comment becomes "- -" and a
+// trailing '-' gets a space; "?>" inside a processing instruction becomes "? >".
+// The XML declaration is written from the document's "xml" processing instruction, with its
+// encoding always "UTF-8" (the bytes written are UTF-8); a document without one gets none.
+// No whitespace is added except a line break after each node at document level.
+
+#include <string>
+
+#include "DomDocument.h"
+
+namespace kest {
+namespace detail {
+
+/// Appends the XML text of `node` (its subtree included) to `out`. Iterative: any depth works.
+void WriteXml(const DomNode* node, std::string& out);
+
+}  // namespace detail
+}  // namespace kest
