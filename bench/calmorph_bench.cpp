@@ -1,0 +1,379 @@
+// Benchmarks of the DOM and the converter, each against a bare expat pass over the same bytes.
+//
+// Every iteration first times the expat pass, then the operation, so that both see the same
+// load of the machine; the ratios are sums of operation times over sums of expat times.
+//
+// Environment:
+//   KEST_BENCH_ITEMS  calibration items of the generated files (default 60000)
+//   KEST_BENCH_ITERS  iterations of each benchmark (default 3)
+//   KEST_BENCH_DIR    directory for the generated files (default: a new temporary directory,
+//                     removed at the end)
+//   KEST_BENCH_SCHEMA the schema copied beside the validated file (default: the source tree's)
+
+#include <benchmark/benchmark.h>
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <functional>
+#include <map>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "BenchSupport.h"
+#include "CdfGen.h"
+#include "core/KestCalmorph.h"
+#include "core/KestCalmorphDLLError.h"
+#include "model/KestCdfCalList.h"
+#include "platform/XmlDom.h"
+
+#ifndef KEST_BENCH_SCHEMA
+#define KEST_BENCH_SCHEMA ""
+#endif
+
+using namespace kest;
+using namespace kest::bench;
+
+namespace {
+
+struct Setup {
+    std::string dir;
+    bool ownDir = false;
+    std::string plainFile;   // names no schema
+    std::string schemaFile;  // names cdf.xsd, which lies beside it
+    std::string domOut;
+    std::string writeOut;
+    std::uint64_t plainBytes = 0;
+    std::uint64_t schemaBytes = 0;
+    long items = 0;
+    int iterations = 3;
+};
+Setup g;
+
+// The last figures of each benchmark, for the summary after the run.
+struct Figure {
+    std::string what;
+    std::string against;
+    double ratio = 0;
+    double target = 0;
+    double opMs = 0;
+    double baseMs = 0;
+};
+std::map<std::string, Figure> g_figures;
+std::vector<std::string> g_order;
+
+void Record(const std::string& key, Figure f) {
+    if (!g_figures.count(key)) g_order.push_back(key);
+    g_figures[key] = std::move(f);
+}
+
+long EnvLong(const char* name, long fallback) {
+    const char* v = std::getenv(name);
+    if (!v || !*v) return fallback;
+    char* end = nullptr;
+    const long n = std::strtol(v, &end, 10);
+    return (end && *end == '\0' && n > 0) ? n : fallback;
+}
+
+std::string Describe(const std::exception_ptr& e) {
+    try {
+        std::rethrow_exception(e);
+    } catch (const KestCalmorphDLLError& error) {
+        return "KestCalmorphDLLError " + std::to_string(error.GetReason()) + " " +
+               error.GetReasonString().ToString();
+    } catch (const std::exception& error) {
+        return error.what();
+    } catch (long hr) {
+        return "HRESULT " + std::to_string(hr);
+    } catch (...) {
+        return "unknown exception";
+    }
+}
+
+double TimedExpat(const std::string& path) {
+    const auto t0 = std::chrono::steady_clock::now();
+    const ExpatPassResult r = ExpatPass(path);
+    const double t = SecondsSince(t0);
+    if (!r.ok) throw std::runtime_error("expat: " + path + ": " + r.error);
+    benchmark::DoNotOptimize(r.elements);
+    return t;
+}
+
+long CountItems(const KestCdfCalData& data) {
+    long items = 0;
+    KestCdfCalList* lists = data.GetCalLists();
+    for (int i = 0; lists && i < data.GetCalListSize(); ++i) items += lists[i].GetCalItemSize();
+    return items;
+}
+
+// Times of one benchmark: expat and operation, per iteration.
+struct Samples {
+    std::vector<double> base;
+    std::vector<double> op;
+    std::vector<double> extra;  // a second reference where a benchmark has one
+    static double Sum(const std::vector<double>& v) {
+        double s = 0;
+        for (double x : v) s += x;
+        return s;
+    }
+    static double Min(const std::vector<double>& v) {
+        return v.empty() ? 0 : *std::min_element(v.begin(), v.end());
+    }
+};
+
+// Runs `op` (which returns the seconds of its timed part) once per iteration after a timed
+// expat pass over `baselineFile`, and reports the ratio against expat.
+void Measure(benchmark::State& state, const std::string& key, const std::string& what,
+             const std::string& baselineFile, std::uint64_t bytes, double target,
+             const std::function<double(Samples&)>& op) {
+    Samples s;
+    for (auto _ : state) {
+        try {
+            s.base.push_back(TimedExpat(baselineFile));
+            const double t = op(s);
+            s.op.push_back(t);
+            state.SetIterationTime(t);
+        } catch (...) {
+            state.SkipWithError(Describe(std::current_exception()).c_str());
+            break;
+        }
+    }
+    if (s.op.empty() || s.op.size() != s.base.size()) return;
+    const double ratio = Samples::Sum(s.op) / Samples::Sum(s.base);
+    state.counters["expat_ms"] = 1e3 * Samples::Sum(s.base) / static_cast<double>(s.base.size());
+    state.counters["ratio_vs_expat"] = ratio;
+    state.counters["ratio_min"] = Samples::Min(s.op) / Samples::Min(s.base);
+    state.SetBytesProcessed(static_cast<int64_t>(bytes) * static_cast<int64_t>(s.op.size()));
+    Figure f;
+    f.what = what;
+    f.against = "expat";
+    f.ratio = ratio;
+    f.target = target;
+    f.opMs = 1e3 * Samples::Sum(s.op) / static_cast<double>(s.op.size());
+    f.baseMs = 1e3 * Samples::Sum(s.base) / static_cast<double>(s.base.size());
+    Record(key, f);
+    if (!s.extra.empty() && s.extra.size() == s.op.size()) {
+        state.counters["ref_ms"] = 1e3 * Samples::Sum(s.extra) / static_cast<double>(s.extra.size());
+    }
+}
+
+void BM_ExpatBaseline(benchmark::State& state) {
+    for (auto _ : state) {
+        const double t = TimedExpat(g.plainFile);
+        state.SetIterationTime(t);
+    }
+    state.SetBytesProcessed(static_cast<int64_t>(g.plainBytes) *
+                            static_cast<int64_t>(state.iterations()));
+}
+
+// Creates a document with validate-on-parse off and loads the file; returns the load time.
+double LoadDocument(const std::string& path, IXMLDOMDocument2Ptr& doc) {
+    const auto t0 = std::chrono::steady_clock::now();
+    doc = nullptr;
+    if (FAILED(doc.CreateInstance(kProgIdDOMDocument40)))
+        throw std::runtime_error("cannot create a DOM document");
+    doc->Putasync(VARIANT_FALSE);
+    doc->PutvalidateOnParse(VARIANT_FALSE);
+    const VARIANT_BOOL ok = doc->load(_variant_t(path));
+    const double t = SecondsSince(t0);
+    if (ok != VARIANT_TRUE)
+        throw std::runtime_error("load failed: " + doc->GetparseError()->Getreason().ToString());
+    return t;
+}
+
+void BM_DomLoad(benchmark::State& state) {
+    Measure(state, "dom_load", "DOM load (validate-on-parse off)", g.plainFile, g.plainBytes,
+            2.0, [](Samples&) {
+                IXMLDOMDocument2Ptr doc;
+                const double t = LoadDocument(g.plainFile, doc);
+                doc = nullptr;  // freeing the tree is not part of the load
+                return t;
+            });
+}
+
+void BM_DomSave(benchmark::State& state) {
+    std::vector<double> loads;
+    Measure(state, "dom_save", "DOM save of the loaded document", g.plainFile, g.plainBytes, 0,
+            [&loads](Samples& s) {
+                IXMLDOMDocument2Ptr doc;
+                const double load = LoadDocument(g.plainFile, doc);
+                loads.push_back(load);
+                s.extra.push_back(load);
+                const auto t0 = std::chrono::steady_clock::now();
+                doc->save(_variant_t(g.domOut));
+                const double t = SecondsSince(t0);
+                doc = nullptr;
+                return t;
+            });
+    if (loads.empty() || !g_figures.count("dom_save")) return;
+    Figure& f = g_figures["dom_save"];
+    double save = f.opMs * static_cast<double>(loads.size()) / 1e3;
+    double load = Samples::Sum(loads);
+    state.counters["ratio_vs_load"] = save / load;
+    state.counters["out_bytes"] = static_cast<double>(FileSize(g.domOut));
+    Figure v = f;
+    v.what = "DOM save vs DOM load (same document)";
+    v.against = "DOM load";
+    v.ratio = save / load;
+    v.target = 1.0;
+    v.baseMs = 1e3 * load / static_cast<double>(loads.size());
+    Record("dom_save_vs_load", v);
+    f.target = 0;  // the save has its target against the load, not against expat
+}
+
+double TimedRead(const std::string& path, KestCdfCalData* keep) {
+    KestCalmorph converter;
+    CComBSTR message;
+    const auto t0 = std::chrono::steady_clock::now();
+    KestCdfCalData data = converter.ConvertXMLtoCPP(CComBSTR(path), true, message);
+    const double t = SecondsSince(t0);
+    if (message.Length() != 0)
+        throw std::runtime_error("read " + path + ": " + message.ToString());
+    if (CountItems(data) != g.items)
+        throw std::runtime_error("read " + path + ": " + std::to_string(CountItems(data)) +
+                                 " items instead of " + std::to_string(g.items));
+    if (keep) *keep = data;
+    return t;  // the converter and the copy are freed outside the timed part
+}
+
+void BM_ReadNoSchema(benchmark::State& state) {
+    Measure(state, "read_plain", "ConvertXMLtoCPP, file names no schema", g.plainFile,
+            g.plainBytes, 2.5, [](Samples&) { return TimedRead(g.plainFile, nullptr); });
+}
+
+void BM_ReadValidated(benchmark::State& state) {
+    Measure(state, "read_validated", "ConvertXMLtoCPP, file names cdf.xsd (validated)",
+            g.schemaFile, g.schemaBytes, 3.5,
+            [](Samples&) { return TimedRead(g.schemaFile, nullptr); });
+}
+
+void BM_Write(benchmark::State& state) {
+    static KestCdfCalData tree;
+    static bool haveTree = false;
+    if (!haveTree) {
+        try {
+            TimedRead(g.schemaFile, &tree);
+            haveTree = true;
+        } catch (...) {
+            state.SkipWithError(Describe(std::current_exception()).c_str());
+            for (auto _ : state) {
+            }
+            return;
+        }
+    }
+    Measure(state, "write", "ConvertCPPToXML of the read tree", g.schemaFile, g.schemaBytes, 2.0,
+            [](Samples&) {
+                KestCalmorph converter;
+                const auto t0 = std::chrono::steady_clock::now();
+                const bool ok =
+                    converter.ConvertCPPToXML(tree, CComBSTR(g.writeOut), CComBSTR(u""));
+                const double t = SecondsSince(t0);
+                if (!ok) throw std::runtime_error("ConvertCPPToXML returned false");
+                return t;
+            });
+    state.counters["out_bytes"] = static_cast<double>(FileSize(g.writeOut));
+}
+
+void PrepareFiles() {
+    g.items = EnvLong("KEST_BENCH_ITEMS", 60000);
+    g.iterations = static_cast<int>(EnvLong("KEST_BENCH_ITERS", 3));
+    const char* dir = std::getenv("KEST_BENCH_DIR");
+    if (dir && *dir) {
+        g.dir = dir;
+        mkdir(g.dir.c_str(), 0755);
+    } else {
+        const char* tmp = std::getenv("TMPDIR");
+        std::string pattern = std::string(tmp && *tmp ? tmp : "/tmp") + "/kest-bench-XXXXXX";
+        std::vector<char> buffer(pattern.begin(), pattern.end());
+        buffer.push_back('\0');
+        if (!mkdtemp(buffer.data())) throw std::runtime_error("cannot create " + pattern);
+        g.dir = buffer.data();
+        g.ownDir = true;
+    }
+    g.plainFile = g.dir + "/plain.cdf";
+    g.schemaFile = g.dir + "/validated.cdf";
+    g.domOut = g.dir + "/dom-saved.cdf";
+    g.writeOut = g.dir + "/written.cdf";
+
+    CdfGenOptions options;
+    options.items = g.items;
+    options.seed = 1;
+    options.schema = false;
+    const CdfGenResult plain = GenerateCdf(options, g.plainFile);
+    options.schema = true;
+    const CdfGenResult validated = GenerateCdf(options, g.schemaFile);
+    g.plainBytes = plain.bytes;
+    g.schemaBytes = validated.bytes;
+
+    const char* schemaEnv = std::getenv("KEST_BENCH_SCHEMA");
+    const std::string schema = schemaEnv && *schemaEnv ? schemaEnv : KEST_BENCH_SCHEMA;
+    CopyFile(schema, g.dir + "/cdf.xsd");
+
+    std::printf("Generated %ld items (%ld values, %ld curves, %ld maps) in %d lists:\n"
+                "  %s  %llu bytes (names no schema)\n  %s  %llu bytes (names cdf.xsd)\n",
+                plain.items, plain.values, plain.curves, plain.maps, plain.lists,
+                g.plainFile.c_str(), static_cast<unsigned long long>(g.plainBytes),
+                g.schemaFile.c_str(), static_cast<unsigned long long>(g.schemaBytes));
+    std::fflush(stdout);
+}
+
+void RemoveFiles() {
+    if (!g.ownDir) return;
+    for (const std::string& f :
+         {g.plainFile, g.schemaFile, g.domOut, g.writeOut, g.dir + "/cdf.xsd"})
+        std::remove(f.c_str());
+    rmdir(g.dir.c_str());
+}
+
+void PrintSummary() {
+    std::printf("\nSummary (%ld items, %.1f MB file, %d iterations, mean times)\n", g.items,
+                static_cast<double>(g.plainBytes) / 1e6, g.iterations);
+    std::printf("%-50s %10s %12s %8s %8s  %s\n", "measurement", "time ms", "reference ms",
+                "ratio", "target", "");
+    for (const std::string& key : g_order) {
+        const Figure& f = g_figures[key];
+        char target[32] = "-";
+        const char* verdict = "";
+        if (f.target > 0) {
+            std::snprintf(target, sizeof target, "<= %.1f", f.target);
+            verdict = f.ratio <= f.target ? "met" : "MISSED";
+        }
+        std::printf("%-50s %10.1f %12.1f %8.2f %8s  %s (vs %s)\n", f.what.c_str(), f.opMs,
+                    f.baseMs, f.ratio, target, verdict, f.against.c_str());
+    }
+    std::fflush(stdout);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    benchmark::Initialize(&argc, argv);
+    if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
+    try {
+        PrepareFiles();
+    } catch (const std::exception& e) {
+        std::fprintf(stderr, "calmorph_bench: %s\n", e.what());
+        return 1;
+    }
+    auto add = [](const char* name, void (*fn)(benchmark::State&)) {
+        benchmark::RegisterBenchmark(name, fn)
+            ->Iterations(g.iterations)
+            ->UseManualTime()
+            ->Unit(benchmark::kMillisecond);
+    };
+    add("ExpatBaseline", BM_ExpatBaseline);
+    add("DomLoad", BM_DomLoad);
+    add("DomSave", BM_DomSave);
+    add("ReadNoSchema", BM_ReadNoSchema);
+    add("ReadValidated", BM_ReadValidated);
+    add("Write", BM_Write);
+    benchmark::RunSpecifiedBenchmarks();
+    benchmark::Shutdown();
+    PrintSummary();
+    RemoveFiles();
+    return 0;
+}
