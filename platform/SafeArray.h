@@ -15,7 +15,10 @@ struct SAFEARRAYBOUND {
 };
 
 /// An array descriptor. Only one dimension and VARIANT elements are supported; the data is
-/// owned by the descriptor and released by SafeArrayDestroy.
+/// owned by the descriptor and released by SafeArrayDestroy. A descriptor must come from
+/// SafeArrayCreate/SafeArrayCreateVector/SafeArrayCopy: it sits in a larger hidden block that
+/// records how many elements pvData has room for, so that SafeArrayRedim grows the storage by
+/// doubling and a loop that adds one element at a time stays linear.
 struct SAFEARRAY {
     USHORT cDims;
     USHORT fFeatures;
@@ -34,16 +37,21 @@ SAFEARRAY* SafeArrayCreate(VARTYPE vt, UINT dims, SAFEARRAYBOUND* bounds) noexce
 HRESULT SafeArrayDestroy(SAFEARRAY* array) noexcept;
 /// Stores a copy of *value (a VARIANT) at *index; DISP_E_BADINDEX outside the bounds.
 HRESULT SafeArrayPutElement(SAFEARRAY* array, const LONG* index, const void* value) noexcept;
-/// Copies the element at *index into *value (a VARIANT, overwritten without clearing).
+/// Copies the element at *index into *value (a VARIANT, overwritten without clearing);
+/// DISP_E_BADINDEX outside the bounds, and *value is not touched on failure.
 HRESULT SafeArrayGetElement(SAFEARRAY* array, const LONG* index, void* value) noexcept;
-/// Resizes to bound->cElements elements keeping those below; new elements are empty.
+/// Resizes to bound->cElements elements keeping those below (removed ones are cleared); new
+/// elements are empty. DISP_E_ARRAYISLOCKED while the data is accessed.
 HRESULT SafeArrayRedim(SAFEARRAY* array, SAFEARRAYBOUND* bound) noexcept;
 /// Deep copy of the array and its elements.
 HRESULT SafeArrayCopy(SAFEARRAY* array, SAFEARRAY** copy) noexcept;
+/// Bounds of dimension 1 (the upper bound of an empty array is the lower bound minus one);
+/// DISP_E_BADINDEX for any other dimension, E_INVALIDARG for null arguments.
 HRESULT SafeArrayGetLBound(SAFEARRAY* array, UINT dim, LONG* bound) noexcept;
 HRESULT SafeArrayGetUBound(SAFEARRAY* array, UINT dim, LONG* bound) noexcept;
 UINT SafeArrayGetDim(SAFEARRAY* array) noexcept;
-/// Direct access to the element storage; pair with SafeArrayUnaccessData.
+/// Direct access to the element storage; pair with SafeArrayUnaccessData. Each call adds a
+/// lock; E_UNEXPECTED when unaccessing an array that is not locked.
 HRESULT SafeArrayAccessData(SAFEARRAY* array, void** data) noexcept;
 HRESULT SafeArrayUnaccessData(SAFEARRAY* array) noexcept;
 

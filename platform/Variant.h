@@ -53,6 +53,25 @@ HRESULT VariantCopy(VARIANT* target, const VARIANT* source) noexcept;
 /// To VT_R8/VT_R4/VT_I4/VT_I2 from text: a decimal number with optional sign, fraction and
 /// exponent, blanks allowed around it; anything else is DISP_E_TYPEMISMATCH and a value out of
 /// range DISP_E_OVERFLOW. Conversions to integers round half to even.
+///
+/// Details of the text forms:
+/// - Shortest form: among all texts that read back to the same value, the one with the fewest
+///   characters, fixed notation on a tie. The exponent carries its sign and at least two digits
+///   ("1e+20", "1e-05", "1.5e-300"). Negative zero is "-0". Not-a-number is "NaN", infinities
+///   are "Infinity" and "-Infinity"; these three do not convert back to numbers.
+/// - Number grammar: blanks (space, tab, CR, LF) * [+|-] (digits [. digits*] | . digits)
+///   [(e|E) [+|-] digits] blanks*. The empty text, "inf", "nan", "0x10", "1,5" and "1e" are
+///   DISP_E_TYPEMISMATCH; a magnitude above the target type's range is DISP_E_OVERFLOW; a
+///   magnitude below the smallest double reads as zero.
+/// - To VT_BOOL from text: "True" or "False" in any letter case (blanks around allowed), or a
+///   number as above, non-zero meaning VARIANT_TRUE. Numbers to VT_BOOL: non-zero is true;
+///   VT_BOOL to numbers: -1 and 0.
+/// - Doubles to VT_R4: DISP_E_OVERFLOW above the float range. Doubles to VT_I4/VT_I2 (also
+///   from text): rounded half to even, then DISP_E_OVERFLOW outside the type's range (NaN too).
+/// - VT_EMPTY converts to 0, false and ""; VT_EMPTY to VT_NULL is allowed. VT_NULL, VT_ERROR
+///   and arrays convert only to their own type (a deep copy) and to VT_EMPTY; otherwise
+///   DISP_E_TYPEMISMATCH. An unsupported type on either side is DISP_E_BADVARTYPE.
+/// - `flags` is accepted for compatibility and has no effect. On failure *target is unchanged.
 HRESULT VariantChangeType(VARIANT* target, const VARIANT* source, USHORT flags, VARTYPE vt) noexcept;
 
 }  // namespace kest
