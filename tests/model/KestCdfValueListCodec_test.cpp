@@ -1,0 +1,347 @@
+// The number reader and writer of the value list codec are checked against the C library in
+// the C locale (the rules they promise), the tokenizer and the text builder on their own.
+#include <gtest/gtest.h>
+
+#include <climits>
+#include <clocale>
+#include <cmath>
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+#include <limits>
+#include <locale.h>
+#include <random>
+#include <stdlib.h>
+#include <string>
+#include <vector>
+
+#include "model/KestCdfValueListCodec.h"
+
+using namespace kest;
+using namespace kest::detail;
+
+namespace {
+
+locale_t CLocale() {
+    static const locale_t c = newlocale(LC_ALL_MASK, "C", static_cast<locale_t>(0));
+    return c;
+}
+
+double ReferenceAtof(const std::string& token) {
+    return strtod_l(token.c_str(), nullptr, CLocale());
+}
+
+// atoi, with the 32-bit narrowing made a saturation.
+int ReferenceAtoi(const std::string& token) {
+    long value = strtol_l(token.c_str(), nullptr, 10, CLocale());
+    if (value > INT_MAX) return INT_MAX;
+    if (value < INT_MIN) return INT_MIN;
+    return static_cast<int>(value);
+}
+
+std::uint64_t Bits(double value) {
+    std::uint64_t bits;
+    std::memcpy(&bits, &value, sizeof bits);
+    return bits;
+}
+
+// printf "%.15g" in the C locale, its exponent padded to three digits.
+std::string ReferenceFormat(double value) {
+    char buffer[64];
+    std::snprintf(buffer, sizeof buffer, "%.15g", value);
+    std::string text = buffer;
+    std::size_t e = text.find('e');
+    if (e != std::string::npos) {
+        std::size_t digits = text.size() - (e + 2);
+        if (digits < 3) text.insert(e + 2, 3 - digits, '0');
+    }
+    return text;
+}
+
+std::string Format(double value) {
+    char buffer[kDoubleTextCapacity];
+    return std::string(buffer, FormatDouble(value, buffer));
+}
+
+double Atof(const std::string& token) { return ParseDouble(token.data(), token.data() + token.size()); }
+int Atoi(const std::string& token) { return ParseInt(token.data(), token.data() + token.size()); }
+
+std::vector<std::string> TrickyTokens() {
+    std::vector<std::string> tokens = {
+        "", " ", "\t5", "\n\v\f\r7", "+", "-", "+-1", "-+1", ".", "-.", "+.e5", ".5", "5.",
+        "-0", "+0.0", "-0.0e9", "1e", "1e+", "1e-", "1e-5", "1E5", "1e5x", "1.5e3.2", "1..2",
+        "0x", "0x1p3", "0X1P-2", "-0x.8", "0x1p", "0xg", "0x1.fffffffffffff8p1023", "inf",
+        "INF", "-Infinity", "infin", "infinityx", "in", "nan", "NaN(123)", "nan(", "nan()",
+        "nan(a_b)", "-nan", "n", "1e400", "-1e400", "1e-400", "4.9e-324", "2.4703282292062328e-324",
+        "2.2250738585072011e-308", "123456789012345678901234567890", "0.1", "9007199254740993",
+        "1,5", "abc", "\x7f" "1", "00012", "1_000", "2147483647", "2147483648", "-2147483648",
+        "-2147483649", "99999999999999999999", "-99999999999999999999", "  42abc", "1e5",
+        "0.30000000000000004", "1.7976931348623157e308", "1.7976931348623159e308", "e5", "-e5",
+        std::string("1\0" "2", 3),
+    };
+    tokens.push_back(std::string(200, '0') + "1");
+    tokens.push_back("1" + std::string(200, '0'));
+    tokens.push_back("-" + std::string(300, '9'));
+    tokens.push_back("0." + std::string(400, '0') + "123");
+    tokens.push_back("0x" + std::string(300, 'f') + "p-1000");
+    tokens.push_back(std::string(150, '1') + "." + std::string(150, '1') + "e-150");
+    return tokens;
+}
+
+}  // namespace
+
+TEST(KestCdfValueListCodec, ParsesTrickyTokensAsTheCLibraryDoes) {
+    for (const std::string& token : TrickyTokens()) {
+        SCOPED_TRACE("token \"" + token + "\"");
+        EXPECT_EQ(Bits(ReferenceAtof(token)), Bits(Atof(token)));
+        EXPECT_EQ(ReferenceAtoi(token), Atoi(token));
+    }
+}
+
+TEST(KestCdfValueListCodec, ParsesRandomTokensAsTheCLibraryDoes) {
+    static const char kAlphabet[] = "0123456789000111+-..eEeExXpPabcdfinINtyFa( )_\t\n";
+    std::mt19937 random(20261206u);
+    std::uniform_int_distribution<int> length(0, 14);
+    std::uniform_int_distribution<int> pick(0, sizeof kAlphabet - 2);
+    for (int i = 0; i < 200000; ++i) {
+        std::string token;
+        for (int n = length(random); n > 0; --n) token.push_back(kAlphabet[pick(random)]);
+        const double expected = ReferenceAtof(token);
+        const double actual = Atof(token);
+        if (Bits(expected) != Bits(actual) || ReferenceAtoi(token) != Atoi(token)) {
+            ADD_FAILURE() << "token \"" << token << "\": atof " << expected << " vs " << actual
+                          << ", atoi " << ReferenceAtoi(token) << " vs " << Atoi(token);
+            return;
+        }
+    }
+}
+
+TEST(KestCdfValueListCodec, ParsesRandomDecimalsExactly) {
+    std::mt19937_64 random(42u);
+    for (int i = 0; i < 100000; ++i) {
+        double value;
+        std::uint64_t bits = random();
+        std::memcpy(&value, &bits, sizeof value);
+        char text[64];
+        std::snprintf(text, sizeof text, (i % 2) ? "%.17g" : "%.15g", value);
+        ASSERT_EQ(Bits(ReferenceAtof(text)), Bits(Atof(text))) << text;
+    }
+}
+
+TEST(KestCdfValueListCodec, IntegersOutside32BitsSaturate) {
+    EXPECT_EQ(INT_MAX, Atoi("2147483648"));
+    EXPECT_EQ(INT_MAX, Atoi("4294967297"));
+    EXPECT_EQ(INT_MIN, Atoi("-2147483649"));
+    EXPECT_EQ(INT_MIN, Atoi("-" + std::string(5000, '9')));
+    EXPECT_EQ(INT_MAX, Atoi(std::string(5000, '9') + "x"));
+}
+
+TEST(KestCdfValueListCodec, FormatsLikePrintfWithThreeExponentDigits) {
+    struct Row {
+        double value;
+        const char* text;
+    } rows[] = {
+        {1e20, "1e+020"},
+        {1e-5, "1e-005"},
+        {1e300, "1e+300"},
+        {-1.5e-300, "-1.5e-300"},
+        {0.1, "0.1"},
+        {2.5, "2.5"},
+        {3.0, "3"},
+        {-0.0, "-0"},
+        {123456789012345678.0, "1.23456789012346e+017"},
+        {0.30000000000000004, "0.3"},
+        {1e15, "1e+015"},
+        {999999999999999.0, "999999999999999"},
+        {0.0001, "0.0001"},
+        {std::numeric_limits<double>::infinity(), "inf"},
+        {-std::numeric_limits<double>::infinity(), "-inf"},
+        {std::numeric_limits<double>::quiet_NaN(), "nan"},
+        {-std::numeric_limits<double>::quiet_NaN(), "-nan"},
+        {std::numeric_limits<double>::denorm_min(), "4.94065645841247e-324"},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.text);
+        EXPECT_EQ(row.text, Format(row.value));
+        EXPECT_EQ(ReferenceFormat(row.value), Format(row.value));
+    }
+}
+
+TEST(KestCdfValueListCodec, FormatsRandomDoublesLikePrintf) {
+    std::mt19937_64 random(7u);
+    for (int i = 0; i < 100000; ++i) {
+        double value;
+        std::uint64_t bits = random();
+        if (i % 3 == 0) bits &= 0x800FFFFFFFFFFFFFull | (std::uint64_t(1000 + i % 100) << 52);
+        std::memcpy(&value, &bits, sizeof value);
+        ASSERT_EQ(ReferenceFormat(value), Format(value)) << std::hexfloat << value;
+    }
+}
+
+TEST(KestCdfValueListCodec, CountsSpacesOnlyForNumericText) {
+    struct Row {
+        bool numeric;
+        std::u16string text;
+        int count;
+    } rows[] = {
+        {true, u"", 1},         {true, u"1", 1},      {true, u"1 2 3", 3},
+        {true, u" 1 2", 3},     {true, u"1  2", 3},   {true, u"1 2 ", 3},
+        {true, u"1\t2\n3", 1},  {false, u"1 2 3", 0}, {false, u"", 0},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(std::string(row.text.begin(), row.text.end()));
+        EXPECT_EQ(row.count, CountValues(row.numeric, row.text));
+    }
+}
+
+namespace {
+
+std::vector<_variant_t> Elements(const VARIANT& array) {
+    std::vector<_variant_t> result;
+    for (LONG i = 0; i < static_cast<LONG>(array.parray->rgsabound[0].cElements); ++i) {
+        _variant_t element;
+        EXPECT_EQ(S_OK, SafeArrayGetElement(array.parray, &i, &element));
+        result.push_back(element);
+    }
+    return result;
+}
+
+}  // namespace
+
+TEST(KestCdfValueListCodec, TokensOfAnyLengthParseByTheirLeadingCharacters) {
+    const std::string zeros(300, '0');
+    const std::u16string text = u"0" + std::u16string(zeros.begin(), zeros.end()) + u"7 " +
+                                u"1" + std::u16string(zeros.begin(), zeros.end()) + u" 5";
+    _variant_t array = NewValueArray(3);
+    FillNumbers(text, NumberTyping::kWholeText, array);
+    std::vector<_variant_t> elements = Elements(array);
+    ASSERT_EQ(3u, elements.size());
+    EXPECT_EQ(VT_I4, elements[0].vt);
+    EXPECT_EQ(7, elements[0].lVal);
+    EXPECT_EQ(INT_MAX, elements[1].lVal);
+    EXPECT_EQ(5, elements[2].lVal);
+
+    _variant_t doubles = NewValueArray(2);
+    FillNumbers(u"1." + std::u16string(1000, u'5') + u" 0." + std::u16string(500, u'0') + u"1",
+                NumberTyping::kWholeText, doubles);
+    elements = Elements(doubles);
+    EXPECT_EQ(VT_R8, elements[0].vt);
+    EXPECT_DOUBLE_EQ(1.5555555555555556, elements[0].dblVal);
+    EXPECT_EQ(VT_R8, elements[1].vt);
+    EXPECT_EQ(0.0, elements[1].dblVal);  // 1e-501 underflows, as strtod has it
+}
+
+TEST(KestCdfValueListCodec, CharactersOutsideAsciiEndANumber) {
+    _variant_t array = NewValueArray(3);
+    FillNumbers(u"12\u00B34 \uFF15 7\u00A0", NumberTyping::kWholeText, array);
+    std::vector<_variant_t> elements = Elements(array);
+    EXPECT_EQ(12, elements[0].lVal);
+    EXPECT_EQ(0, elements[1].lVal);
+    EXPECT_EQ(7, elements[2].lVal);
+}
+
+TEST(KestCdfValueListCodec, TokensBeyondTheArrayAreDropped) {
+    _variant_t array = NewValueArray(2);
+    FillNumbers(u"1 2 3 4", NumberTyping::kPerToken, array);
+    std::vector<_variant_t> elements = Elements(array);
+    ASSERT_EQ(2u, elements.size());
+    EXPECT_EQ(VT_R8, elements[0].vt);
+    EXPECT_EQ(VT_I4, elements[1].vt);
+    EXPECT_EQ(2, elements[1].lVal);
+}
+
+TEST(KestCdfValueListCodec, SplitsQuotedStrings) {
+    struct Row {
+        std::u16string text;
+        std::vector<std::u16string> strings;
+    } rows[] = {
+        {u"\"a b\" \"c\"", {u"a b", u"c"}},
+        {u"x\"a\"y\"\"z", {u"a", u""}},
+        {u"\"open", {}},
+        {u"\"a\" \"b", {u"a"}},
+        {u"no quotes", {}},
+        {u"\"", {}},
+        {u"\"\"\"\"", {u"", u""}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(std::string(row.text.begin(), row.text.end()));
+        _variant_t array = NewValueArray(0);
+        PutQuotedStrings(row.text, array);
+        std::vector<_variant_t> elements = Elements(array);
+        ASSERT_EQ(row.strings.size(), elements.size());
+        for (std::size_t i = 0; i < elements.size(); ++i) {
+            EXPECT_EQ(VT_BSTR, elements[i].vt);
+            EXPECT_EQ(row.strings[i], std::u16string(BstrView(elements[i].bstrVal)));
+        }
+    }
+}
+
+TEST(KestCdfValueListCodec, RejectsATargetThatIsNoArray) {
+    _variant_t number(1.0);
+    EXPECT_THROW(FillNumbers(u"1", NumberTyping::kPerToken, number), _com_error);
+    EXPECT_THROW(PutQuotedStrings(u"\"a\"", number), _com_error);
+}
+
+TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
+    _variant_t array = NewValueArray(7);
+    VARIANT* data = nullptr;
+    ASSERT_EQ(S_OK, SafeArrayAccessData(array.parray, reinterpret_cast<void**>(&data)));
+    data[0].vt = VT_R8, data[0].dblVal = 1e20;
+    data[1].vt = VT_R4, data[1].fltVal = 0.1f;
+    data[2].vt = VT_I4, data[2].lVal = -42;
+    data[3].vt = VT_BSTR, data[3].bstrVal = SysAllocString(u"a b");
+    data[4].vt = VT_EMPTY;
+    data[5].vt = VT_I2, data[5].iVal = 7;
+    data[6].vt = VT_BOOL, data[6].boolVal = VARIANT_TRUE;
+    ASSERT_EQ(S_OK, SafeArrayUnaccessData(array.parray));
+
+    _variant_t axis = FormatValueList(array, ElementWriting::kAxis);
+    ASSERT_EQ(VT_BSTR, axis.vt);
+    EXPECT_EQ(u"1e+020 0.100000001490116 -42 a b 0 7 -1",
+              std::u16string(BstrView(axis.bstrVal)));
+    _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue);
+    EXPECT_EQ(u"1e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
+}
+
+TEST(KestCdfValueListCodec, WritesTheEmptyTextForNoArray) {
+    for (const _variant_t& value : {_variant_t(), _variant_t(2.5), _variant_t(u"x")}) {
+        _variant_t text = FormatValueList(value, ElementWriting::kAxis);
+        ASSERT_EQ(VT_BSTR, text.vt);
+        EXPECT_EQ(0u, SysStringLen(text.bstrVal));
+    }
+    _variant_t empty = FormatValueList(NewValueArray(0), ElementWriting::kCalItemValue);
+    EXPECT_EQ(0u, SysStringLen(empty.bstrVal));
+}
+
+TEST(KestCdfValueListCodec, IndexesTheArrayCannotDeliverAddNothing) {
+    // An array whose lower bound is 1: index 0 cannot be fetched, and adds no separator.
+    SAFEARRAYBOUND bound{3, 1};
+    _variant_t array;
+    array.vt = VT_ARRAY | VT_VARIANT;
+    array.parray = SafeArrayCreate(VT_VARIANT, 1, &bound);
+    ASSERT_NE(nullptr, array.parray);
+    for (LONG i = 1; i <= 3; ++i) {
+        _variant_t element(static_cast<int>(i * 10));
+        ASSERT_EQ(S_OK, SafeArrayPutElement(array.parray, &i, &element));
+    }
+    _variant_t text = FormatValueList(array, ElementWriting::kAxis);
+    EXPECT_EQ(u"10 20", std::u16string(BstrView(text.bstrVal)));
+}
+
+TEST(KestCdfValueListCodec, IgnoresTheProcessLocale) {
+    const std::string previous = std::setlocale(LC_ALL, nullptr);
+    if (!std::setlocale(LC_ALL, "de_DE.UTF-8"))
+        GTEST_SKIP() << "the locale de_DE.UTF-8 is not installed on this machine";
+    char printed[8];
+    std::snprintf(printed, sizeof printed, "%.1f", 2.5);
+    EXPECT_STREQ("2,5", printed) << "the locale does not change the C library's separator";
+    EXPECT_EQ(2.5, Atof("2.5"));
+    EXPECT_EQ(2.0, Atof("2,5"));
+    EXPECT_EQ("2.5", Format(2.5));
+    EXPECT_EQ("1.5e+020", Format(1.5e20));
+    _variant_t array = NewValueArray(2);
+    FillNumbers(u"0.25 1e-5", NumberTyping::kPerToken, array);
+    _variant_t text = FormatValueList(array, ElementWriting::kCalItemValue);
+    std::setlocale(LC_ALL, previous.c_str());
+    EXPECT_EQ(u"0.25 1", std::u16string(BstrView(text.bstrVal)));
+}
