@@ -142,6 +142,14 @@ void ReportConversionError(const std::string& file, const KestCalmorphDLLError& 
     std::fputc('\n', stderr);
 }
 
+// "file:line:column", "file:line" or "file", as far as the position is known.
+std::string Where(const std::string& file, long line, long column) {
+    std::string where = file;
+    if (line > 0) where += ":" + std::to_string(line);
+    if (line > 0 && column > 0) where += ":" + std::to_string(column);
+    return where;
+}
+
 // Reloads a file that failed to load, to learn the line and column of the failure.
 void ReportLoadFailure(const std::string& file, const std::string& reason, bool validate) {
     long line = 0;
@@ -160,12 +168,8 @@ void ReportLoadFailure(const std::string& file, const std::string& reason, bool 
     } catch (...) {
         // The reason alone still says what went wrong.
     }
-    if (line > 0) {
-        std::fprintf(stderr, "calmorph: %s:%ld:%ld: cannot load: %s\n", file.c_str(), line, column,
-                     reason.c_str());
-    } else {
-        std::fprintf(stderr, "calmorph: %s: cannot load: %s\n", file.c_str(), reason.c_str());
-    }
+    std::fprintf(stderr, "calmorph: %s: cannot load: %s\n", Where(file, line, column).c_str(),
+                 reason.c_str());
 }
 
 bool IsRegularReadableFile(const std::string& path) {
@@ -443,14 +447,9 @@ int ValidateAgainstNamedSchema(const std::string& file) {
         std::printf("%s: valid against %s\n", file.c_str(), location.c_str());
         return kExitOk;
     }
-    long line = result->Getline();
-    if (line > 0) {
-        std::fprintf(stderr, "calmorph: %s:%ld:%ld: not valid against %s: %s\n", file.c_str(), line,
-                     static_cast<long>(result->Getlinepos()), location.c_str(), reason.c_str());
-    } else {
-        std::fprintf(stderr, "calmorph: %s: not valid against %s: %s\n", file.c_str(),
-                     location.c_str(), reason.c_str());
-    }
+    std::fprintf(stderr, "calmorph: %s: not valid against %s: %s\n",
+                 Where(file, result->Getline(), result->Getlinepos()).c_str(), location.c_str(),
+                 reason.c_str());
     return kExitInvalid;
 }
 
