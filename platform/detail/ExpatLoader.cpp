@@ -260,7 +260,6 @@ ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const
                 error.line = static_cast<long>(XML_GetCurrentLineNumber(parser));
                 error.linepos = static_cast<long>(XML_GetCurrentColumnNumber(parser)) + 1;
                 error.filepos = static_cast<long>(XML_GetCurrentByteIndex(parser));
-                if (bytes.empty()) what = "no element found (the document is empty)";
             }
             error.reason = DescribeLocation(what, error.line, error.linepos, url);
             error.srcText = LineAt(bytes, error.filepos);
