@@ -32,5 +32,25 @@ inline double SecondsSince(std::chrono::steady_clock::time_point start) {
     return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
 }
 
+/// CPU time of the whole process (user and system), in seconds. On a machine shared with
+/// other work it is steadier than wall time; the library starts no threads of its own.
+double ProcessCpuSeconds();
+
+/// Wall and CPU time of one measured piece.
+struct Lap {
+    double wall = 0;
+    double cpu = 0;
+};
+
+class Stopwatch {
+public:
+    Stopwatch() : m_wall(std::chrono::steady_clock::now()), m_cpu(ProcessCpuSeconds()) {}
+    Lap Stop() const { return Lap{SecondsSince(m_wall), ProcessCpuSeconds() - m_cpu}; }
+
+private:
+    std::chrono::steady_clock::time_point m_wall;
+    double m_cpu;
+};
+
 }  // namespace bench
 }  // namespace kest

@@ -95,6 +95,25 @@ TEST(CdfGen, FilesLoadAndValidateInEveryForm) {
     }
 }
 
+// Guards the test above: loading with validation does refuse a generated file that breaks the
+// schema (a CRC in lowercase), so an empty load error there means the file is valid.
+TEST(CdfGen, ValidationSeesABrokenFile) {
+    TempDir dir;
+    ASSERT_TRUE(dir.ok());
+    CopyFile(KEST_SOURCE_DIR "/schema/cdf.xsd", dir.File("cdf.xsd"));
+    CdfGenOptions options;
+    options.items = 20;
+    const std::string path = dir.File("broken.cdf");
+    GenerateCdf(options, path);
+    std::string text = ReadAll(path);
+    const std::size_t crc = text.find("crc32=\"0x");
+    ASSERT_NE(crc, std::string::npos);
+    text.replace(crc + 9, 8, "abcdef12");
+    std::ofstream(path, std::ios::binary | std::ios::trunc) << text;
+    EXPECT_EQ(LoadError(path, false), "");
+    EXPECT_NE(LoadError(path, true), "");
+}
+
 TEST(CdfGen, ConverterReadsTheGeneratedMix) {
     TempDir dir;
     ASSERT_TRUE(dir.ok());
