@@ -199,9 +199,11 @@ xmlParserInputPtr GuardedEntityLoader(const char* url, const char* id, xmlParser
     if (!policy) return g_previousLoader ? g_previousLoader(url, id, ctxt) : nullptr;
     if (!url) return nullptr;
     std::string location(url);
-    // A load with no input open yet starts a new document (a schema document being included or
-    // imported); with input open it is an entity or DTD referenced from inside a document.
-    bool documentLoad = ctxt == nullptr || ctxt->inputNr == 0;
+    // A schema document (the schema itself, or one it includes or imports) is loaded into a
+    // fresh parser context: no input open and none created yet. DTDs and parameter entities
+    // load with the document's input open, and external general entities get a sub-context
+    // whose input numbering continues from the document's.
+    bool documentLoad = ctxt != nullptr && ctxt->inputNr == 0 && ctxt->input_id <= 1;
     if (!documentLoad || !policy->allowLocalSchemas) {
         Refuse(*policy, "external resource '" + location + "' refused: entities and DTDs are "
                         "not read during schema processing");
