@@ -7,8 +7,8 @@ namespace {
 
 IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
                              const OLECHAR* name, const _bstr_t& ns) {
-    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
-                                             _bstr_t(name), ns);
+    IXMLDOMNodePtr element =
+        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(name), ns);
     parent->appendChild(element);
     return element;
 }

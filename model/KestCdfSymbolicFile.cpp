@@ -104,14 +104,13 @@ bool KestCdfSymbolicFile::ConvertSymbolicFileNode(IXMLDOMNodePtr node) {
     return true;
 }
 
-bool KestCdfSymbolicFile::ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr parent,
-                                                       IXMLDOMDocument* doc,
+bool KestCdfSymbolicFile::ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                                        KestCdfNormalizedString ns) {
     char buffer[11] = "0x00000000";
     if (!doc) throw _com_error(E_POINTER);
-    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
-                                             _bstr_t(u"SYMBOLIC-FILE"),
-                                             _bstr_t(ns.m_string.m_str, true));
+    IXMLDOMNodePtr element =
+        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(u"SYMBOLIC-FILE"),
+                        _bstr_t(ns.m_string.m_str, true));
     parent->appendChild(element);
     IXMLDOMNodePtr text =
         doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));

@@ -1,8 +1,9 @@
 // CHANGE-HISTORY: counting, reading and writing the change entries, and sharing them.
+#include "model/KestCdfChangeHistory.h"
+
 #include <new>
 
 #include "ModelTestDom.h"
-#include "model/KestCdfChangeHistory.h"
 
 namespace kest {
 namespace {

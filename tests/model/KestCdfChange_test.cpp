@@ -1,6 +1,7 @@
 // CHANGE: one change entry, read in any order, written in a fixed order.
-#include "ModelTestDom.h"
 #include "model/KestCdfChange.h"
+
+#include "ModelTestDom.h"
 
 namespace kest {
 namespace {
@@ -10,8 +11,7 @@ using test::Ns;
 using test::Utf8;
 
 // Writes `change` under a fresh parent and returns the CHANGE element.
-IXMLDOMNodePtr Write(KestCdfChange& change, IXMLDOMDocument2Ptr& doc,
-                     const char16_t* ns = u"") {
+IXMLDOMNodePtr Write(KestCdfChange& change, IXMLDOMDocument2Ptr& doc, const char16_t* ns = u"") {
     doc = test::NewDocument();
     IXMLDOMNodePtr parent = doc->createElement(_bstr_t(u"CHANGE-HISTORY"));
     doc->appendChild(parent);
@@ -78,13 +78,16 @@ TEST(KestCdfChange, FailureInsideOneChildEndsTheEntryQuietly) {
         const char* user;
         const char* tool;
     } rows[] = {
-        {"month 13", u"<CHANGE><USERNAME>u</USERNAME><DATE>2024-13-01T00:00:00</DATE>"
-                     u"<TOOL>t</TOOL></CHANGE>", "u", ""},
+        {"month 13",
+         u"<CHANGE><USERNAME>u</USERNAME><DATE>2024-13-01T00:00:00</DATE>"
+         u"<TOOL>t</TOOL></CHANGE>",
+         "u", ""},
         {"short date", u"<CHANGE><DATE>2024-01-01</DATE><USERNAME>u</USERNAME></CHANGE>", "", ""},
-        {"element in a text", u"<CHANGE><TOOL>a<b/></TOOL><USERNAME>u</USERNAME></CHANGE>", "",
-         ""},
-        {"element first in the user name", u"<CHANGE><USERNAME><b/></USERNAME><TOOL>t</TOOL>"
-                                           u"</CHANGE>", "", ""},
+        {"element in a text", u"<CHANGE><TOOL>a<b/></TOOL><USERNAME>u</USERNAME></CHANGE>", "", ""},
+        {"element first in the user name",
+         u"<CHANGE><USERNAME><b/></USERNAME><TOOL>t</TOOL>"
+         u"</CHANGE>",
+         "", ""},
     };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.label);

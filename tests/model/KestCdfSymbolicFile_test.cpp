@@ -1,9 +1,10 @@
 // SYMBOLIC-FILE: CRC text parsing and formatting, reading, writing and round trips.
+#include "model/KestCdfSymbolicFile.h"
+
 #include <climits>
 #include <cstring>
 
 #include "ModelTestDom.h"
-#include "model/KestCdfSymbolicFile.h"
 
 namespace kest {
 namespace {
@@ -27,23 +28,23 @@ TEST(KestCdfSymbolicFile, AtohdReadsHexadecimalOnlyWithLowercaseX) {
         {"0x0000001A", 26},
         {" 0x10", 16},
         {"\t\n0x10", 16},
-        {"ffx", 255},                // an 'x' anywhere selects hexadecimal
+        {"ffx", 255},  // an 'x' anywhere selects hexadecimal
         {"1x", 1},
         {"0x", 0},
         {"0xg", 0},
-        {"-0x1", -1},                // negated within 32 bits, as strtoul does
+        {"-0x1", -1},  // negated within 32 bits, as strtoul does
         {"+0x7F", 127},
-        {"0x100000000", -1},         // beyond 32 bits
+        {"0x100000000", -1},  // beyond 32 bits
         {"0x123456789ABCDEF0123", -1},
         {"255", 255},
         {"12AB", 12},
         {"ABCD", 0},
-        {"0X1A", 0},                 // capital X alone reads as decimal
+        {"0X1A", 0},  // capital X alone reads as decimal
         {"  -42", -42},
         {"+7", 7},
         {"", 0},
         {"2147483647", INT_MAX},
-        {"2147483648", INT_MAX},     // decimal saturates at the ends of the int range
+        {"2147483648", INT_MAX},  // decimal saturates at the ends of the int range
         {"-2147483648", INT_MIN},
         {"-2147483649", INT_MIN},
         {"99999999999999999999999", INT_MAX},
@@ -60,12 +61,8 @@ TEST(KestCdfSymbolicFile, HdtoaWritesUppercaseDigitsIntoThePreparedBuffer) {
         unsigned int value;
         const char* expected;
     } rows[] = {
-        {0u, "0x00000000"},
-        {26u, "0x0000001A"},
-        {0xFFFFFFFFu, "0xFFFFFFFF"},
-        {0x80000000u, "0x80000000"},
-        {0xDEADBEEFu, "0xDEADBEEF"},
-        {0x00ABC000u, "0x00ABC000"},
+        {0u, "0x00000000"},          {26u, "0x0000001A"},         {0xFFFFFFFFu, "0xFFFFFFFF"},
+        {0x80000000u, "0x80000000"}, {0xDEADBEEFu, "0xDEADBEEF"}, {0x00ABC000u, "0x00ABC000"},
     };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.expected);
@@ -162,11 +159,13 @@ TEST(KestCdfSymbolicFile, GetNodeStringGivesTheAttributeText) {
 TEST(KestCdfSymbolicFile, WriterNeedsAParentAndADocument) {
     IXMLDOMDocument2Ptr doc = test::NewDocument();
     KestCdfSymbolicFile file;
-    ExpectComError([&] { file.ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr(), doc.GetInterfacePtr(), Ns(u"")); },
-                   E_POINTER);
+    ExpectComError(
+        [&] {
+            file.ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr(), doc.GetInterfacePtr(), Ns(u""));
+        },
+        E_POINTER);
     IXMLDOMNodePtr parent = doc->createElement(_bstr_t(u"P"));
-    ExpectComError([&] { file.ConvertSymbolicFileNodeToXML(parent, nullptr, Ns(u"")); },
-                   E_POINTER);
+    ExpectComError([&] { file.ConvertSymbolicFileNodeToXML(parent, nullptr, Ns(u"")); }, E_POINTER);
     EXPECT_FALSE(parent->hasChildNodes());
 }
 

@@ -1,6 +1,7 @@
 // TARGET-IMAGE: the twin of SYMBOLIC-FILE, lenient where the element lacks its attribute.
-#include "ModelTestDom.h"
 #include "model/KestCdfTargetImage.h"
+
+#include "ModelTestDom.h"
 
 namespace kest {
 namespace {
