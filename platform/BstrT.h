@@ -56,6 +56,8 @@ public:
     BSTR copy(bool copy = true) const;
     /// The shared BSTR, owned by this object.
     BSTR GetBSTR() const noexcept;
+    /// The BSTR for writing: a shared string is first copied, so that writes through the
+    /// reference reach this object alone, and the cached UTF-8 form is dropped.
     BSTR& GetBSTR();
     /// Takes ownership of `text`, dropping this object's share of the old one.
     void Attach(BSTR text);

@@ -1,0 +1,67 @@
+#include "core/KestCalmorphDLLError.h"
+
+#include <gtest/gtest.h>
+
+#include <set>
+
+using namespace kest;
+
+TEST(KestCalmorphDLLError, NewObjectHasCodeZeroAndEmptyText) {
+    KestCalmorphDLLError error;
+    EXPECT_EQ(error.GetReason(), 0);
+    EXPECT_EQ(error.GetReasonString().Length(), 0u);
+}
+
+TEST(KestCalmorphDLLError, CopiesNeverShareTheirText) {
+    KestCalmorphDLLError error;
+    error.SetReason(45);
+    error.SetReasonString(CComBSTR(u"abc"));
+    KestCalmorphDLLError copy(error);
+    EXPECT_EQ(copy.GetReason(), 45);
+    EXPECT_EQ(copy.GetReasonString(), CComBSTR(u"abc"));
+    copy.SetReasonString(CComBSTR(u"changed"));
+    EXPECT_EQ(error.GetReasonString(), CComBSTR(u"abc"));
+
+    KestCalmorphDLLError assigned;
+    assigned = error;
+    EXPECT_EQ(assigned.GetReason(), 45);
+    assigned.SetReason(12);
+    assigned.SetReasonString(CComBSTR(u"item"));
+    EXPECT_EQ(error.GetReason(), 45);
+    EXPECT_EQ(error.GetReasonString(), CComBSTR(u"abc"));
+}
+
+TEST(KestCalmorphDLLError, RaiseThrowsTheCodeWithEmptyText) {
+    try {
+        KestCalmorphDLLError::Raise(reason::kHourOutOfRange);
+        FAIL() << "no exception";
+    } catch (const KestCalmorphDLLError& error) {
+        EXPECT_EQ(error.GetReason(), 37);
+        EXPECT_EQ(error.GetReasonString().Length(), 0u);
+    }
+}
+
+TEST(KestCalmorphDLLError, ReasonCodesAreDistinct) {
+    const int codes[] = {
+        reason::kCalDataNotConverted, reason::kAxisAttributeMissing, reason::kCalItemReadFailed,
+        reason::kWalkFailed, reason::kCalListReadFailed, reason::kCalDataReadFailed,
+        reason::kCalDataNotAttribute, reason::kTargetImageNotAttribute,
+        reason::kSymbolicFileAttribute, reason::kValueNotAttribute, reason::kAxisNoAttributeMap,
+        reason::kNewElementRefused, reason::kNewElementFailed, reason::kSchemaInstanceMissing,
+        reason::kSchemaLocationMissing, reason::kSymbolicFileMissing, reason::kAxisValueEmpty,
+        reason::kAxisWriteNoAttributeMap, reason::kCalItemValueMissing,
+        reason::kCalListNameMissing, reason::kCalItemNameMissing, reason::kCalItemSizeUnset,
+        reason::kChangeCountUnset, reason::kYearOutOfRange, reason::kMonthOutOfRange,
+        reason::kDayOutOfRange, reason::kHourOutOfRange, reason::kMinuteOutOfRange,
+        reason::kSecondOutOfRange, reason::kDateTextLength, reason::kCalDataNoAttributeMap,
+        reason::kCalDataAttributeMissing, reason::kSchemaNotLoaded,
+        reason::kSchemaLocationAbsent};
+    std::set<int> seen;
+    for (int code : codes) {
+        SCOPED_TRACE(code);
+        EXPECT_TRUE(seen.insert(code).second) << "duplicate code";
+        EXPECT_FALSE(code >= 1 && code <= 10) << "codes 1 to 10 are never raised";
+        EXPECT_NE(code, 28);
+        EXPECT_NE(code, 43);
+    }
+}
