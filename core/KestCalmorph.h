@@ -30,7 +30,8 @@ public:
     KestCdfCalData ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CComBSTR& message);
     /// Writes `data` to `outputPath` as a UTF-8 CDF file, with `comment` as the first child of
     /// CAL-DATA when not empty. False for an empty path; throws KestCalmorphDLLError when the
-    /// tree is incomplete (nothing is written) and _com_error when saving fails.
+    /// tree is incomplete (nothing is written) and _com_error when saving fails (an existing
+    /// file is then left as it was). The document lives only for this call.
     bool ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment);
     /// A new default tree; the converter is not touched.
     KestCdfCalData ConvertCPPToXML();
@@ -42,17 +43,23 @@ public:
     /// True when the DOM service (parser, validator, document creation) is usable; otherwise
     /// writes "\nError: MSXML 4.0 is not installed. Exiting.\n" to standard error.
     bool IsMSXML4Installed();
-    /// The schema location the file's root names in "xsi:schemaLocation" (the text after the
-    /// first blank); empty with the parser's reason in `message` when the file does not load.
+    /// The schema location the file's root names in "xsi:schemaLocation": the text after the
+    /// first blank, however long; a value without any blank is returned whole (a location
+    /// alone). The file is loaded with validation against the schemas it names. Empty with the
+    /// parser's reason in `message` when the file does not load; KestCalmorphDLLError 45 when
+    /// the root has no "xsi:schemaLocation", 44 when the load fails without a reason code.
     CComBSTR DetectSchemaLocation(CComBSTR path, CComBSTR& message);
     /// Whether a schema location can be reached: an http URL that loads, "cdf.xsd" beside the
-    /// data file, or any other location as a readable path.
+    /// data file (the directory part of `path`, up to its last '/' or '\\'), or any other
+    /// location as a path readable from the current directory. A directory is not readable as
+    /// a schema; a null location is not valid (false).
     bool IsSchemaLocationValid(CComBSTR location, CComBSTR path);
     /// Validates the data file against the schema file under the CDF namespace URI: empty when
     /// valid, "FAIL" when the data file did not load without a reason, else the reason.
     CComBSTR ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR schemaPath);
 
-    /// True when a server file name reads as "msxml" followed by a version of at least 4.0.
+    /// True when a server file name (the text after the last '\\' or '/') reads as "msxml"
+    /// followed by a plain decimal version (digits, optional fraction) of at least 4.0.
     static bool IsSupportedServerFileName(const char* fileName);
 
 private:
@@ -63,6 +70,8 @@ private:
     void CreateXMLEnvironment();
     bool SaveDocument(CComBSTR path);
     void NewXMLNodeElement(const OLECHAR* name);
+    /// The directory part of `path`, up to and including its last '/' or '\\'; empty when it
+    /// has neither.
     std::string GetFilePath(CComBSTR path);
 
     KestCdfCalData m_calData;
