@@ -23,6 +23,7 @@ struct Builder {
     long maxDepth = 0;
     int doctypeDepth = 0;
     bool inCdata = false;
+    bool utf8Bom = false;  // the bytes start with a UTF-8 byte order mark (encoding not forced)
     std::string text;  // character data not yet turned into a node
 
     // Why the build stopped the parser, when it did.
@@ -61,6 +62,12 @@ struct Builder {
         text.clear();
     }
 };
+
+bool IsUtf8Label(const char* name) {
+    std::string lower;
+    for (const char* p = name; *p; ++p) lower += static_cast<char>(*p >= 'A' && *p <= 'Z' ? *p + 32 : *p);
+    return lower == "utf-8" || lower == "utf8";
+}
 
 template <class F>
 void Guard(void* data, F&& body) {
@@ -153,6 +160,12 @@ void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* enco
                        int standalone) {
     Guard(data, [&](Builder& b) {
         if (!version || b.current != b.top) return;  // a text declaration of an entity
+        if (b.utf8Bom && encoding && !IsUtf8Label(encoding)) {
+            // expat lets the mark win silently; the document contradicts itself, so refuse it.
+            b.Stop(std::string("encoding \"") + encoding +
+                   "\" declared after a UTF-8 byte order mark");
+            return;
+        }
         DomNode* decl = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.store->Intern("xml"));
         auto add = [&](const char* name, std::string_view value) {
             DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(name));
@@ -224,6 +237,7 @@ ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const
         b.store = result.store.get();
         b.top = b.current = result.top;
         b.maxDepth = maxElementDepth;
+        b.utf8Bom = !forcedEncoding && bytes.size() >= 3 && bytes.compare(0, 3, "\xEF\xBB\xBF") == 0;
         XML_SetUserData(parser, &b);
         XML_SetElementHandler(parser, OnStart, OnEnd);
         XML_SetCharacterDataHandler(parser, OnCharacters);

@@ -56,6 +56,8 @@ TEST(DomLoad, BadInputFailsWithReasonAndLocationAndLeavesDocumentEmpty) {
         {"billion laughs", kBillionLaughs, "limit on input amplification factor", 14},
         {"bad attribute", "<a b=c/>", "not well-formed (invalid token) at line 1, column 6", 1},
         {"duplicate attribute", "<a b='1' b='2'/>", "duplicate attribute", 1},
+        {"BOM contradicts declaration", "\xef\xbb\xbf<?xml version='1.0' encoding='ISO-8859-1'?><a/>",
+         "encoding \"ISO-8859-1\" declared after a UTF-8 byte order mark at line 1", 1},
         {"UTF-16 BOM on UTF-8 bytes", "\xff\xfe<a/>", "not well-formed", 1},
     };
     for (const Row& row : rows) {
