@@ -82,6 +82,13 @@ inline bool EightAscii(const unsigned char* p) noexcept {
     return (word & 0x8080808080808080ull) == 0;
 }
 
+// True when the four code units at `p` are all ASCII.
+inline bool FourAscii(const char16_t* p) noexcept {
+    std::uint64_t word;
+    std::memcpy(&word, p, sizeof word);
+    return (word & 0xFF80FF80FF80FF80ull) == 0;
+}
+
 // Decodes UTF-8 into `out`, which has room for at least utf8.size() code units (UTF-16 never
 // needs more units than UTF-8 has bytes). Returns the number of units written.
 //
@@ -229,14 +236,19 @@ std::string Utf16ToUtf8(std::u16string_view utf16) {
     const char16_t* end = p + utf16.size();
     // Exact size first: one pass over the units is cheaper than growing the string.
     std::size_t size = 0;
-    for (const char16_t* q = p; q < end; ++q) {
-        char16_t unit = *q;
+    for (const char16_t* q = p; q < end;) {
+        if (end - q >= 4 && FourAscii(q)) {
+            size += 4;
+            q += 4;
+            continue;
+        }
+        char16_t unit = *q++;
         if (unit < 0x80) {
             size += 1;
         } else if (unit < 0x800) {
             size += 2;
-        } else if (unit >= 0xD800 && unit <= 0xDBFF && q + 1 < end && q[1] >= 0xDC00 &&
-                   q[1] <= 0xDFFF) {
+        } else if (unit >= 0xD800 && unit <= 0xDBFF && q < end && *q >= 0xDC00 &&
+                   *q <= 0xDFFF) {
             size += 4;
             ++q;
         } else {
@@ -245,19 +257,24 @@ std::string Utf16ToUtf8(std::u16string_view utf16) {
     }
     std::string result(size, '\0');
     char* o = result.data();
-    if (size == utf16.size()) {
-        for (; p < end; ++p) *o++ = static_cast<char>(*p);
-        return result;
-    }
-    for (; p < end; ++p) {
-        std::uint32_t code = *p;
+    while (p < end) {
+        if (end - p >= 4 && FourAscii(p)) {
+            o[0] = static_cast<char>(p[0]);
+            o[1] = static_cast<char>(p[1]);
+            o[2] = static_cast<char>(p[2]);
+            o[3] = static_cast<char>(p[3]);
+            o += 4;
+            p += 4;
+            continue;
+        }
+        std::uint32_t code = *p++;
         if (code < 0x80) {
             *o++ = static_cast<char>(code);
             continue;
         }
         if (code >= 0xD800 && code <= 0xDFFF) {
-            if (code <= 0xDBFF && p + 1 < end && p[1] >= 0xDC00 && p[1] <= 0xDFFF) {
-                code = 0x10000 + ((code - 0xD800) << 10) + (p[1] - 0xDC00);
+            if (code <= 0xDBFF && p < end && *p >= 0xDC00 && *p <= 0xDFFF) {
+                code = 0x10000 + ((code - 0xD800) << 10) + (*p - 0xDC00);
                 ++p;
             } else {
                 code = kReplacement;
