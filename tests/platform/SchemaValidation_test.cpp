@@ -138,9 +138,11 @@ TEST(SchemaValidation, RelativeLocationsResolveAgainstTheDocumentDirectory) {
     TempDir dir;
     WriteFile(dir.Path() / "data" / "cdf.xsd", ReadFile(kCdfXsd));
     WriteFile(dir.Path() / "schemas" / "cdf.xsd", ReadFile(kCdfXsd));
+    WriteFile(dir.Path() / "with space %20" / "cdf.xsd", ReadFile(kCdfXsd));
     std::string document = ReadFile(kDataDir + "/valid-compact.cdf");
     std::string documentPath = dir / "data/a.cdf";
-    const char* locations[] = {"cdf.xsd", "./cdf.xsd", "../schemas/cdf.xsd", "../schemas/../data/cdf.xsd"};
+    const char* locations[] = {"cdf.xsd", "./cdf.xsd", "../schemas/cdf.xsd", "../schemas/../data/cdf.xsd",
+                           "../with space %20/cdf.xsd"};
     for (const char* location : locations) {
         SCOPED_TRACE(location);
         ValidationOutcome outcome =
