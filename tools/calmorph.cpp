@@ -150,23 +150,34 @@ std::string Where(const std::string& file, long line, long column) {
     return where;
 }
 
-// Reloads a file that failed to load, to learn the line and column of the failure.
+// Reads "line N, column M" from a parser's reason text; false when it holds no position.
+bool PositionInReason(const std::string& reason, long& line, long& column) {
+    std::string::size_type at = reason.find("at line ");
+    if (at == std::string::npos) return false;
+    return std::sscanf(reason.c_str() + at, "at line %ld, column %ld", &line, &column) == 2 &&
+           line > 0;
+}
+
+// Names the position of a load failure: from the reason when it tells, otherwise by loading the
+// file once more and asking the parse error.
 void ReportLoadFailure(const std::string& file, const std::string& reason, bool validate) {
     long line = 0;
     long column = 0;
-    try {
-        IXMLDOMDocument2Ptr document;
-        if (SUCCEEDED(document.CreateInstance(kProgIdDOMDocument40))) {
-            document->Putasync(VARIANT_FALSE);
-            document->PutvalidateOnParse(validate ? VARIANT_TRUE : VARIANT_FALSE);
-            if (document->load(_variant_t(file)) == VARIANT_FALSE) {
-                IXMLDOMParseErrorPtr parseError = document->GetparseError();
-                line = parseError->Getline();
-                column = parseError->Getlinepos();
+    if (!PositionInReason(reason, line, column)) {
+        try {
+            IXMLDOMDocument2Ptr document;
+            if (SUCCEEDED(document.CreateInstance(kProgIdDOMDocument40))) {
+                document->Putasync(VARIANT_FALSE);
+                document->PutvalidateOnParse(validate ? VARIANT_TRUE : VARIANT_FALSE);
+                if (document->load(_variant_t(file)) == VARIANT_FALSE) {
+                    IXMLDOMParseErrorPtr parseError = document->GetparseError();
+                    line = parseError->Getline();
+                    column = parseError->Getlinepos();
+                }
             }
+        } catch (...) {
+            // The reason alone still says what went wrong.
         }
-    } catch (...) {
-        // The reason alone still says what went wrong.
     }
     std::fprintf(stderr, "calmorph: %s: cannot load: %s\n", Where(file, line, column).c_str(),
                  reason.c_str());
