@@ -11,6 +11,8 @@
 #include <random>
 #include <string>
 
+#include <unistd.h>
+
 #include "platform/BStr.h"
 
 using namespace kest;
@@ -399,8 +401,10 @@ TEST(Variant, ConversionIgnoresTheProcessLocale) {
     // A locale with ',' as its decimal separator; built on the fly if it is not installed.
     const char* name = "de_DE.UTF-8";
     std::string previous = std::setlocale(LC_ALL, nullptr);
+    std::string dir;
     if (!std::setlocale(LC_ALL, name)) {
-        std::string dir = testing::TempDir() + "kest-locales";
+        // One folder per process: test runs in parallel must not write the same files.
+        dir = testing::TempDir() + "kest-locales-" + std::to_string(getpid());
         std::string command = "mkdir -p '" + dir + "' && localedef -i de_DE -f UTF-8 '" + dir +
                               "/" + name + "' >/dev/null 2>&1";
         if (std::system(command.c_str()) == 0) {
@@ -408,6 +412,14 @@ TEST(Variant, ConversionIgnoresTheProcessLocale) {
             std::setlocale(LC_ALL, name);
         }
     }
+    struct RemoveDir {
+        const std::string& dir;
+        ~RemoveDir() {
+            if (dir.empty()) return;
+            int status = std::system(("rm -rf '" + dir + "'").c_str());
+            static_cast<void>(status);
+        }
+    } removeDir{dir};
     if (std::string(std::setlocale(LC_ALL, nullptr)) != name) {
         GTEST_SKIP() << "no German locale is installed and localedef could not build one";
     }

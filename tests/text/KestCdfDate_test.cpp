@@ -5,8 +5,6 @@
 #include <climits>
 #include <cstring>
 #include <ctime>
-#include <thread>
-#include <vector>
 
 #include "core/KestCalmorphDLLError.h"
 
@@ -176,18 +174,4 @@ TEST(KestCdfDate, CopiesAreIndependent) {
     KestCdfDate third(first);
     first.SetMonth(12);
     EXPECT_EQ(third.GetMonth(), 11);
-}
-
-TEST(KestCdfDate, ConcurrentConstructionIsSafe) {
-    // localtime_r keeps no shared state; constructing dates on many threads must agree.
-    std::vector<std::thread> threads;
-    std::vector<int> years(8);
-    for (int i = 0; i < 8; ++i) {
-        threads.emplace_back([&years, i] {
-            for (int n = 0; n < 1000; ++n) years[i] = KestCdfDate().GetYear();
-        });
-    }
-    for (std::thread& thread : threads) thread.join();
-    KestCdfDate now;
-    for (int year : years) EXPECT_NEAR(year, now.GetYear(), 1);
 }
