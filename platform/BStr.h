@@ -1,5 +1,7 @@
 #pragma once
 // BSTR: a length-prefixed, zero-terminated UTF-16 string; a null BSTR reads as empty.
+// The byte count sits in the four bytes before the pointer; a zero code unit follows the text.
+// Strings must be made and freed by the Sys* functions below.
 //
 // Narrow text is UTF-8 everywhere in this library. Conversions never fail on bad input:
 // an invalid UTF-8 sequence becomes U+FFFD (one per maximal ill-formed subsequence), and an
@@ -19,7 +21,8 @@ using LPCOLESTR = const OLECHAR*;
 
 /// New BSTR holding a copy of the zero-terminated text; null for a null argument or no memory.
 BSTR SysAllocString(const OLECHAR* text) noexcept;
-/// New BSTR of `length` characters copied from `text` (zero-filled when `text` is null).
+/// New BSTR of `length` characters copied from `text` (zero-filled when `text` is null);
+/// null when memory runs out or the byte count would not fit in 32 bits.
 BSTR SysAllocStringLen(const OLECHAR* text, UINT length) noexcept;
 /// New BSTR of `bytes` bytes copied from `data` (zero-filled when null); the bytes are not
 /// converted, as on the platform this type comes from.
