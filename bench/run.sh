@@ -53,7 +53,7 @@ peak() {
   if [ "$target" != "-" ]; then
     verdict=$(awk -v r="$ratio" -v t="$target" 'BEGIN { print (r <= t) ? "met" : "MISSED" }')
   fi
-  printf "%-40s %9.1f MB %7s x file  target %-6s %s\n" "$label" \
+  printf "%-40s %9.1f MiB %7s x file  target %-6s %s\n" "$label" \
     "$(awk -v k="$extra" 'BEGIN { print k / 1024 }')" "$ratio" "$target" "$verdict"
 }
 peak "DOM load (validate-on-parse off)" 3.0 dom-load "$work/plain.cdf"
