@@ -3,7 +3,11 @@
 #include "platform/detail/SchemaValidation.h"
 
 #include <gtest/gtest.h>
+#include <arpa/inet.h>
 #include <fcntl.h>
+#include <netinet/in.h>
+#include <poll.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -75,6 +79,45 @@ std::string TinySchema(const std::string& ns, const std::string& type) {
 std::string TinyDocument(const std::string& ns, const std::string& value) {
     return "<r xmlns=\"" + ns + "\"><v>" + value + "</v></r>";
 }
+
+/// Answers one http request on 127.0.0.1 with a fixed response, from a thread; gives up after
+/// a few seconds when no request comes.
+class CannedResponder {
+public:
+    explicit CannedResponder(std::string response) : m_response(std::move(response)) {
+        m_socket = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        sockaddr_in address{};
+        address.sin_family = AF_INET;
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        socklen_t length = sizeof address;
+        if (m_socket < 0 || ::bind(m_socket, reinterpret_cast<sockaddr*>(&address), length) != 0 ||
+            ::getsockname(m_socket, reinterpret_cast<sockaddr*>(&address), &length) != 0 ||
+            ::listen(m_socket, 4) != 0)
+            throw std::runtime_error("cannot listen on 127.0.0.1");
+        m_port = ntohs(address.sin_port);
+        m_thread = std::thread([this] {
+            pollfd waiting{m_socket, POLLIN, 0};
+            if (::poll(&waiting, 1, 5000) != 1) return;
+            int client = ::accept(m_socket, nullptr, nullptr);
+            if (client < 0) return;
+            char request[4096];
+            (void)::recv(client, request, sizeof request, 0);
+            (void)::send(client, m_response.data(), m_response.size(), MSG_NOSIGNAL);
+            ::close(client);
+        });
+    }
+    ~CannedResponder() {
+        m_thread.join();
+        ::close(m_socket);
+    }
+    std::string Url() const { return "http://127.0.0.1:" + std::to_string(m_port) + "/s.xsd"; }
+
+private:
+    std::string m_response;
+    int m_socket = -1;
+    int m_port = 0;
+    std::thread m_thread;
+};
 
 void SetModificationTime(const std::string& path, time_t seconds) {
     struct timespec times[2] = {{seconds, 0}, {seconds, 0}};
@@ -438,4 +481,20 @@ TEST(HttpGet, OnlyHttpAndHttpsAreFetched) {
         HttpGet("http://127.0.0.1:" + std::to_string(port) + "/x", 2);
     EXPECT_FALSE(result.ok);
     EXPECT_FALSE(result.error.empty());
+}
+
+TEST(HttpGet, RedirectsStayOnHttp) {
+    const char* targets[] = {"file:///etc/passwd", "ftp://127.0.0.1/s.xsd"};
+    for (const char* target : targets) {
+        SCOPED_TRACE(target);
+        CannedResponder server(std::string("HTTP/1.1 302 Found\r\nLocation: ") + target +
+                               "\r\nContent-Length: 0\r\nConnection: close\r\n\r\n");
+        kest::detail::HttpResult result = HttpGet(server.Url(), 5);
+        EXPECT_FALSE(result.ok);
+        EXPECT_TRUE(result.body.empty());
+        EXPECT_NE(result.error.find("cannot fetch " + server.Url()), std::string::npos)
+            << result.error;
+        EXPECT_NE(result.error.find("not supported or disabled"), std::string::npos)
+            << result.error;
+    }
 }
