@@ -15,7 +15,7 @@ namespace detail {
 namespace {
 
 class XMLSchemaCollection final : public IXMLDOMSchemaCollection {
-public:
+  public:
     struct Entry {
         std::string namespaceURI;
         std::string location;  // resolved path or URL
@@ -78,7 +78,7 @@ public:
         return m_entries;
     }
 
-private:
+  private:
     mutable std::mutex m_mutex;
     std::vector<Entry> m_entries;
 };

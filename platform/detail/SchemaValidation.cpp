@@ -41,7 +41,7 @@ namespace kest {
 namespace detail {
 
 class CompiledSchema {
-public:
+  public:
     CompiledSchema(xmlSchemaPtr schema, std::string location) noexcept
         : m_schema(schema), m_location(std::move(location)) {}
     ~CompiledSchema() { xmlSchemaFree(m_schema); }
@@ -51,7 +51,7 @@ public:
     xmlSchemaPtr Get() const noexcept { return m_schema; }
     const std::string& Location() const noexcept { return m_location; }
 
-private:
+  private:
     xmlSchemaPtr m_schema;
     std::string m_location;
 };
@@ -115,10 +115,17 @@ std::string XmlAttributeEscape(const std::string& text) {
     std::string out;
     for (char c : text) {
         switch (c) {
-        case '&': out += "&amp;"; break;
-        case '<': out += "&lt;"; break;
-        case '"': out += "&quot;"; break;
-        default: out += c;
+            case '&':
+                out += "&amp;";
+                break;
+            case '<':
+                out += "&lt;";
+                break;
+            case '"':
+                out += "&quot;";
+                break;
+            default:
+                out += c;
         }
     }
     return out;
@@ -205,15 +212,16 @@ xmlParserInputPtr GuardedEntityLoader(const char* url, const char* id, xmlParser
     // whose input numbering continues from the document's.
     bool documentLoad = ctxt != nullptr && ctxt->inputNr == 0 && ctxt->input_id <= 1;
     if (!documentLoad || !policy->allowLocalSchemas) {
-        Refuse(*policy, "external resource '" + location + "' refused: entities and DTDs are "
-                        "not read during schema processing");
+        Refuse(*policy, "external resource '" + location +
+                            "' refused: entities and DTDs are "
+                            "not read during schema processing");
         return nullptr;
     }
     std::string scheme = SchemeOf(location);
     if (scheme == "http" || scheme == "https") {
         if (!policy->allowHttp) {
-            Refuse(*policy, "schema location " + location +
-                                " requires the ServerHTTPRequest property");
+            Refuse(*policy,
+                   "schema location " + location + " requires the ServerHTTPRequest property");
             return nullptr;
         }
         HttpResult fetched = HttpGet(location, kSchemaFetchTimeoutSeconds, kMaxSchemaBytes);
@@ -253,7 +261,7 @@ void InitLibxml() {
 /// Installs the policy and routes every libxml2 message of this thread to `errors` for the
 /// lifetime of the object; restores what was there before.
 class LibxmlScope {
-public:
+  public:
     LibxmlScope(LoadPolicy& policy, ErrorCollector& errors) {
         InitLibxml();
         m_previousPolicy = t_policy;
@@ -273,7 +281,7 @@ public:
     LibxmlScope(const LibxmlScope&) = delete;
     LibxmlScope& operator=(const LibxmlScope&) = delete;
 
-private:
+  private:
     LoadPolicy* m_previousPolicy;
     xmlStructuredErrorFunc m_structured;
     void* m_structuredContext;
@@ -343,13 +351,13 @@ bool FileStamp(const std::string& path, std::string& stamp, std::string& error) 
         error = "schema " + path + " cannot be read: not a regular file";
         return false;
     }
-    stamp = std::to_string(info.st_mtim.tv_sec) + "." + std::to_string(info.st_mtim.tv_nsec) +
-            "/" + std::to_string(info.st_size);
+    stamp = std::to_string(info.st_mtim.tv_sec) + "." + std::to_string(info.st_mtim.tv_nsec) + "/" +
+            std::to_string(info.st_size);
     return true;
 }
 
 class SchemaCache {
-public:
+  public:
     CompiledSchemaHandle Find(const std::string& key, const std::string& stamp) {
         std::lock_guard<std::mutex> lock(m_mutex);
         auto found = m_entries.find(key);
@@ -375,7 +383,7 @@ public:
         if (m_combined.size() > kMaxCombinedSchemas) m_combined.pop_front();
     }
 
-private:
+  private:
     struct Entry {
         std::string stamp;
         CompiledSchemaHandle schema;
@@ -470,7 +478,8 @@ bool ResolveSchemaLocation(const std::string& location, const std::string& baseU
     if (full.is_relative()) {
         std::string base = SchemeOf(baseUrl) == "file" ? FileUrlToPath(baseUrl) : baseUrl;
         std::size_t slash = base.rfind('/');
-        fs::path directory = slash == std::string::npos ? fs::path() : fs::path(base.substr(0, slash + 1));
+        fs::path directory =
+            slash == std::string::npos ? fs::path() : fs::path(base.substr(0, slash + 1));
         full = directory / full;
         std::error_code ignored;
         if (full.is_relative()) full = fs::absolute(full, ignored);
@@ -502,8 +511,8 @@ SchemaLoad LoadCombinedSchema(const std::vector<SchemaRef>& resolvedRefs, bool a
         if (!LocationStamp(ref.location, allowHttp, stamp, error))
             return SchemaFailure(ref.location, error);
         key += ref.namespaceURI + '\n' + ref.location + '\n' + stamp + '\n';
-        std::string uri = IsHttpUrl(ref.location) ? ref.location
-                                                  : "file://" + EscapePathForUri(ref.location);
+        std::string uri =
+            IsHttpUrl(ref.location) ? ref.location : "file://" + EscapePathForUri(ref.location);
         if (ref.namespaceURI.empty())
             includes += "<xs:include schemaLocation=\"" + XmlAttributeEscape(uri) + "\"/>";
         else
@@ -545,10 +554,9 @@ ValidationOutcome ValidateWithSchema(const CompiledSchema& schema, std::string_v
     xmlSchemaSetValidStructuredErrors(validator, CollectError, &errors);
     MemoryCursor cursor{document, 0};
     // No entity substitution, no DTD loading, no network: the loader refuses the rest.
-    xmlTextReaderPtr reader =
-        xmlReaderForIO(ReadFromMemory, CloseMemory, &cursor,
-                       documentUrl.empty() ? nullptr : documentUrl.c_str(), nullptr,
-                       XML_PARSE_NONET);
+    xmlTextReaderPtr reader = xmlReaderForIO(ReadFromMemory, CloseMemory, &cursor,
+                                             documentUrl.empty() ? nullptr : documentUrl.c_str(),
+                                             nullptr, XML_PARSE_NONET);
     if (!reader) {
         xmlSchemaFreeValidCtxt(validator);
         outcome.code = E_OUTOFMEMORY;
@@ -607,9 +615,8 @@ ValidationOutcome ValidateAgainstNamedSchemas(std::string_view document,
         if (!ResolveSchemaLocation(ref.location, documentUrl, target.location, error))
             return SchemaFailure(ref.location, error).failure;
         if (IsHttpUrl(target.location) && !allowHttp)
-            return SchemaFailure(target.location,
-                                 "schema location " + target.location +
-                                     " requires the ServerHTTPRequest property")
+            return SchemaFailure(target.location, "schema location " + target.location +
+                                                      " requires the ServerHTTPRequest property")
                 .failure;
         resolved.push_back(std::move(target));
     }
@@ -721,8 +728,8 @@ HttpResult HttpGet(const std::string& url, long timeoutSeconds, std::size_t maxB
     curl_easy_cleanup(curl);
 
     if (download.tooLarge || code == CURLE_FILESIZE_EXCEEDED) {
-        result.error = "cannot fetch " + url + ": the response exceeds " +
-                       std::to_string(maxBytes) + " bytes";
+        result.error =
+            "cannot fetch " + url + ": the response exceeds " + std::to_string(maxBytes) + " bytes";
     } else if (code != CURLE_OK) {
         result.error = "cannot fetch " + url + ": " +
                        (curlError[0] ? std::string(curlError) : curl_easy_strerror(code));

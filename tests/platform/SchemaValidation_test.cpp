@@ -2,9 +2,9 @@
 // fetching. Servers used here listen on 127.0.0.1 only.
 #include "platform/detail/SchemaValidation.h"
 
-#include <gtest/gtest.h>
 #include <arpa/inet.h>
 #include <fcntl.h>
+#include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <poll.h>
 #include <sys/socket.h>
@@ -51,7 +51,7 @@ void WriteFile(const fs::path& path, const std::string& text) {
 }
 
 class TempDir {
-public:
+  public:
     TempDir() {
         std::string pattern = (fs::temp_directory_path() / "kest-schema-XXXXXX").string();
         if (!::mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp failed");
@@ -64,7 +64,7 @@ public:
     const fs::path& Path() const { return m_path; }
     std::string operator/(const std::string& name) const { return (m_path / name).string(); }
 
-private:
+  private:
     fs::path m_path;
 };
 
@@ -72,7 +72,9 @@ private:
 std::string TinySchema(const std::string& ns, const std::string& type) {
     return "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" targetNamespace=\"" + ns +
            "\" elementFormDefault=\"qualified\"><xs:element name=\"r\"><xs:complexType>"
-           "<xs:sequence><xs:element name=\"v\" type=\"" + type + "\"/></xs:sequence>"
+           "<xs:sequence><xs:element name=\"v\" type=\"" +
+           type +
+           "\"/></xs:sequence>"
            "</xs:complexType></xs:element></xs:schema>";
 }
 
@@ -83,7 +85,7 @@ std::string TinyDocument(const std::string& ns, const std::string& value) {
 /// Answers one http request on 127.0.0.1 with a fixed response, from a thread; gives up after
 /// a few seconds when no request comes.
 class CannedResponder {
-public:
+  public:
     explicit CannedResponder(std::string response) : m_response(std::move(response)) {
         m_socket = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
         sockaddr_in address{};
@@ -112,7 +114,7 @@ public:
     }
     std::string Url() const { return "http://127.0.0.1:" + std::to_string(m_port) + "/s.xsd"; }
 
-private:
+  private:
     std::string m_response;
     int m_socket = -1;
     int m_port = 0;
@@ -148,8 +150,8 @@ TEST(SchemaValidation, CdfDocumentsAgainstTheCdfSchema) {
     for (const Row& row : rows) {
         SCOPED_TRACE(row.file);
         std::string path = kDataDir + "/" + row.file;
-        ValidationOutcome outcome = ValidateAgainstNamedSchemas(ReadFile(path), path,
-                                                                {{kCdfNs, kCdfXsd}}, false);
+        ValidationOutcome outcome =
+            ValidateAgainstNamedSchemas(ReadFile(path), path, {{kCdfNs, kCdfXsd}}, false);
         EXPECT_EQ(outcome.code, row.code) << outcome.reason;
         EXPECT_EQ(outcome.line, row.line);
         if (row.code == S_OK) {
@@ -165,8 +167,8 @@ TEST(SchemaValidation, CdfDocumentsAgainstTheCdfSchema) {
 TEST(SchemaValidation, XmllintAgreesWithTheCdfSchema) {
     if (std::system("xmllint --version > /dev/null 2>&1") != 0) GTEST_SKIP() << "no xmllint";
     const char* valid[] = {"valid-compact.cdf", "valid-indented.cdf"};
-    const char* invalid[] = {"missing-filename.cdf", "wrong-order.cdf", "bad-crc32.cdf",
-                             "bad-date.cdf", "missing-value.cdf", "bad-axis-size.cdf"};
+    const char* invalid[] = {"missing-filename.cdf", "wrong-order.cdf",   "bad-crc32.cdf",
+                             "bad-date.cdf",         "missing-value.cdf", "bad-axis-size.cdf"};
     auto run = [](const char* file) {
         std::string command = "xmllint --noout --schema '" + kCdfXsd + "' '" + kDataDir + "/" +
                               file + "' > /dev/null 2>&1";
@@ -184,8 +186,8 @@ TEST(SchemaValidation, RelativeLocationsResolveAgainstTheDocumentDirectory) {
     WriteFile(dir.Path() / "with space %20" / "cdf.xsd", ReadFile(kCdfXsd));
     std::string document = ReadFile(kDataDir + "/valid-compact.cdf");
     std::string documentPath = dir / "data/a.cdf";
-    const char* locations[] = {"cdf.xsd", "./cdf.xsd", "../schemas/cdf.xsd", "../schemas/../data/cdf.xsd",
-                           "../with space %20/cdf.xsd"};
+    const char* locations[] = {"cdf.xsd", "./cdf.xsd", "../schemas/cdf.xsd",
+                               "../schemas/../data/cdf.xsd", "../with space %20/cdf.xsd"};
     for (const char* location : locations) {
         SCOPED_TRACE(location);
         ValidationOutcome outcome =
@@ -200,7 +202,8 @@ TEST(SchemaValidation, RelativeLocationsResolveAgainstTheDocumentDirectory) {
 
 TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
     TempDir dir;
-    WriteFile(dir.Path() / "broken.xsd", "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">\n<xs:element");
+    WriteFile(dir.Path() / "broken.xsd",
+              "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">\n<xs:element");
     WriteFile(dir.Path() / "not-a-schema.xsd", ReadFile(kDataDir + "/valid-compact.cdf"));
     WriteFile(dir.Path() / "bad-type.xsd", TinySchema(kCdfNs, "xs:nosuchtype"));
     std::string withEntity = TinySchema(kCdfNs, "xs:int");
@@ -228,8 +231,8 @@ TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
     std::string document = ReadFile(kDataDir + "/valid-compact.cdf");
     for (const Row& row : rows) {
         SCOPED_TRACE(row.location);
-        ValidationOutcome outcome = ValidateAgainstNamedSchemas(document, dir / "a.cdf",
-                                                                {{kCdfNs, row.location}}, false);
+        ValidationOutcome outcome =
+            ValidateAgainstNamedSchemas(document, dir / "a.cdf", {{kCdfNs, row.location}}, false);
         EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
         EXPECT_NE(outcome.reason.find(row.fragment), std::string::npos) << outcome.reason;
     }
@@ -247,8 +250,8 @@ TEST(SchemaValidation, SchemaForAnotherNamespaceIsRefused) {
 }
 
 TEST(SchemaValidation, MalformedDocumentGivesParseFailureWithPosition) {
-    std::string document = "<?xml version=\"1.0\"?>\n<CAL-DATA xmlns=\"" + kCdfNs +
-                           "\"><CHANGE-HISTORY>\n</CAL-DATA>";
+    std::string document =
+        "<?xml version=\"1.0\"?>\n<CAL-DATA xmlns=\"" + kCdfNs + "\"><CHANGE-HISTORY>\n</CAL-DATA>";
     ValidationOutcome outcome =
         ValidateAgainstNamedSchemas(document, "/d/m.cdf", {{kCdfNs, kCdfXsd}}, false);
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
@@ -266,9 +269,10 @@ TEST(SchemaValidation, ExternalEntitiesAndDtdsAreNeverRead) {
     // Were either file read, the document would stop being well-formed.
     WriteFile(dir.Path() / "broken.ent", "<unclosed");
     WriteFile(dir.Path() / "broken.dtd", "<!ELEMENT");
-    std::string document = "<?xml version=\"1.0\"?>\n<!DOCTYPE r SYSTEM \"broken.dtd\" [\n"
-                           "<!ENTITY ext SYSTEM \"broken.ent\">]>\n" +
-                           std::string("<r xmlns=\"urn:t\"><v>&ext;</v></r>");
+    std::string document =
+        "<?xml version=\"1.0\"?>\n<!DOCTYPE r SYSTEM \"broken.dtd\" [\n"
+        "<!ENTITY ext SYSTEM \"broken.ent\">]>\n" +
+        std::string("<r xmlns=\"urn:t\"><v>&ext;</v></r>");
     WriteFile(dir.Path() / "t.xsd", TinySchema("urn:t", "xs:string"));
     ValidationOutcome outcome =
         ValidateAgainstNamedSchemas(document, dir / "doc.xml", {{"urn:t", "t.xsd"}}, false);
@@ -319,15 +323,23 @@ TEST(SchemaValidation, ConcurrentValidationsShareCompiledSchemas) {
             ValidationOutcome outcome;
             kest::HRESULT expected = S_OK;
             switch (which) {
-            case 0: outcome = ValidateAgainstNamedSchemas(cdfValid, "v.cdf", {{kCdfNs, kCdfXsd}}, false); break;
-            case 1:
-                outcome = ValidateAgainstNamedSchemas(cdfInvalid, "i.cdf", {{kCdfNs, kCdfXsd}}, false);
-                expected = XML_E_INVALID;
-                break;
-            case 2: outcome = ValidateAgainstNamedSchemas(TinyDocument("urn:i", "42"), dir / "d.xml", {{"urn:i", "int.xsd"}}, false); break;
-            default:
-                outcome = ValidateAgainstNamedSchemas(TinyDocument("urn:i", "x"), dir / "d.xml", {{"urn:i", "int.xsd"}}, false);
-                expected = XML_E_INVALID;
+                case 0:
+                    outcome =
+                        ValidateAgainstNamedSchemas(cdfValid, "v.cdf", {{kCdfNs, kCdfXsd}}, false);
+                    break;
+                case 1:
+                    outcome = ValidateAgainstNamedSchemas(cdfInvalid, "i.cdf", {{kCdfNs, kCdfXsd}},
+                                                          false);
+                    expected = XML_E_INVALID;
+                    break;
+                case 2:
+                    outcome = ValidateAgainstNamedSchemas(
+                        TinyDocument("urn:i", "42"), dir / "d.xml", {{"urn:i", "int.xsd"}}, false);
+                    break;
+                default:
+                    outcome = ValidateAgainstNamedSchemas(TinyDocument("urn:i", "x"), dir / "d.xml",
+                                                          {{"urn:i", "int.xsd"}}, false);
+                    expected = XML_E_INVALID;
             }
             if (outcome.code != expected || (expected != S_OK && outcome.line != 1 && which == 3))
                 ++wrong;
@@ -388,9 +400,11 @@ TEST(SchemaValidation, HttpSchemasNeedPermissionAndResolveAgainstHttpDocuments) 
     std::string invalid = ReadFile(kDataDir + "/wrong-order.cdf");
     std::string url = server.Url("schemas/cdf.xsd");
 
-    ValidationOutcome outcome = ValidateAgainstNamedSchemas(document, "/d/a.cdf", {{kCdfNs, url}}, false);
+    ValidationOutcome outcome =
+        ValidateAgainstNamedSchemas(document, "/d/a.cdf", {{kCdfNs, url}}, false);
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
-    EXPECT_EQ(outcome.reason, "schema location " + url + " requires the ServerHTTPRequest property");
+    EXPECT_EQ(outcome.reason,
+              "schema location " + url + " requires the ServerHTTPRequest property");
 
     EXPECT_EQ(ValidateAgainstNamedSchemas(document, "/d/a.cdf", {{kCdfNs, url}}, true).code, S_OK);
     EXPECT_EQ(ValidateAgainstNamedSchemas(invalid, "/d/a.cdf", {{kCdfNs, url}}, true).code,
@@ -401,7 +415,8 @@ TEST(SchemaValidation, HttpSchemasNeedPermissionAndResolveAgainstHttpDocuments) 
                                           {{kCdfNs, "../schemas/wrapper.xsd"}}, true);
     EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
 
-    outcome = ValidateAgainstNamedSchemas(document, "/d/a.cdf", {{kCdfNs, server.Url("none.xsd")}}, true);
+    outcome =
+        ValidateAgainstNamedSchemas(document, "/d/a.cdf", {{kCdfNs, server.Url("none.xsd")}}, true);
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
     EXPECT_NE(outcome.reason.find("HTTP status 404"), std::string::npos) << outcome.reason;
     EXPECT_NE(outcome.reason.find(server.Url("none.xsd")), std::string::npos) << outcome.reason;
@@ -416,8 +431,9 @@ TEST(SchemaValidation, LocalSchemaImportingHttpNeedsPermission) {
     ValidationOutcome outcome = ValidateAgainstNamedSchemas("<r xmlns=\"urn:a\"/>", dir / "d.xml",
                                                             {{"urn:a", "a.xsd"}}, false);
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
-    EXPECT_NE(outcome.reason.find("http://127.0.0.1:9/b.xsd requires the ServerHTTPRequest property"),
-              std::string::npos)
+    EXPECT_NE(
+        outcome.reason.find("http://127.0.0.1:9/b.xsd requires the ServerHTTPRequest property"),
+        std::string::npos)
         << outcome.reason;
 }
 
@@ -458,7 +474,8 @@ TEST(HttpGet, SilentServerTimesOut) {
     ASSERT_TRUE(server.Started());
     auto start = std::chrono::steady_clock::now();
     kest::detail::HttpResult result = HttpGet(server.Url("x.xsd"), 1);
-    double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+    double seconds =
+        std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
     EXPECT_FALSE(result.ok);
     EXPECT_NE(result.error.find(server.Url("x.xsd")), std::string::npos) << result.error;
     EXPECT_GE(seconds, 0.9);
@@ -466,8 +483,8 @@ TEST(HttpGet, SilentServerTimesOut) {
 }
 
 TEST(HttpGet, OnlyHttpAndHttpsAreFetched) {
-    const char* urls[] = {"file:///etc/passwd", "ftp://127.0.0.1/x", "gopher://127.0.0.1/x",
-                          "/etc/passwd", "dict://127.0.0.1/x", ""};
+    const char* urls[] = {"file:///etc/passwd", "ftp://127.0.0.1/x",  "gopher://127.0.0.1/x",
+                          "/etc/passwd",        "dict://127.0.0.1/x", ""};
     for (const char* url : urls) {
         SCOPED_TRACE(url);
         kest::detail::HttpResult result = HttpGet(url, 2);
@@ -477,8 +494,7 @@ TEST(HttpGet, OnlyHttpAndHttpsAreFetched) {
     }
     // Connection refused is reported, not hidden.
     int port = kest::test::FindFreeLocalPort();
-    kest::detail::HttpResult result =
-        HttpGet("http://127.0.0.1:" + std::to_string(port) + "/x", 2);
+    kest::detail::HttpResult result = HttpGet("http://127.0.0.1:" + std::to_string(port) + "/x", 2);
     EXPECT_FALSE(result.ok);
     EXPECT_FALSE(result.error.empty());
 }

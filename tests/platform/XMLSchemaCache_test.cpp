@@ -28,7 +28,7 @@ std::string ReadFile(const std::string& path) {
 }
 
 class TempDir {
-public:
+  public:
     TempDir() {
         std::string pattern = (fs::temp_directory_path() / "kest-cache-XXXXXX").string();
         if (!::mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp failed");
@@ -44,7 +44,7 @@ public:
         return (m_path / name).string();
     }
 
-private:
+  private:
     fs::path m_path;
 };
 
@@ -128,8 +128,9 @@ TEST(XMLSchemaCache, AddListReplaceAndRemove) {
     cache->add(_bstr_t("urn:a"), _variant_t(a2));
     EXPECT_EQ(cache->Getlength(), 3);
     EXPECT_EQ(cache->GetnamespaceURI(0), _bstr_t("urn:a"));
-    EXPECT_EQ(detail::ValidateAgainstCollection("<v xmlns=\"urn:a\">text</v>", "d.xml", *cache).code,
-              S_OK);
+    EXPECT_EQ(
+        detail::ValidateAgainstCollection("<v xmlns=\"urn:a\">text</v>", "d.xml", *cache).code,
+        S_OK);
 
     cache->remove(_bstr_t(kCdfNs));
     cache->remove(_bstr_t("urn:unknown"));
@@ -143,7 +144,8 @@ TEST(XMLSchemaCache, AddListReplaceAndRemove) {
 
 TEST(XMLSchemaCache, RefusedSchemasLeaveTheCollectionUnchanged) {
     TempDir dir;
-    std::string broken = dir.Write("broken.xsd", "<xs:schema\n xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">\n<oops");
+    std::string broken = dir.Write(
+        "broken.xsd", "<xs:schema\n xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">\n<oops");
     std::string notSchema = dir.Write("doc.xsd", ReadFile(kDataDir + "/valid-compact.cdf"));
     struct Row {
         std::string ns;
@@ -198,12 +200,14 @@ TEST(XMLSchemaCache, ValidatesDocumentsAgainstItsSchemas) {
 
     // With a second namespace the schemas are used together.
     TempDir dir;
-    std::string wrapper = dir.Write(
-        "w.xsd", "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
-                 "targetNamespace=\"urn:w\" elementFormDefault=\"qualified\">"
-                 "<xs:element name=\"w\"><xs:complexType><xs:sequence>"
-                 "<xs:any namespace=\"" + kCdfNs + "\" processContents=\"strict\"/>"
-                 "</xs:sequence></xs:complexType></xs:element></xs:schema>");
+    std::string wrapper = dir.Write("w.xsd",
+                                    "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
+                                    "targetNamespace=\"urn:w\" elementFormDefault=\"qualified\">"
+                                    "<xs:element name=\"w\"><xs:complexType><xs:sequence>"
+                                    "<xs:any namespace=\"" +
+                                        kCdfNs +
+                                        "\" processContents=\"strict\"/>"
+                                        "</xs:sequence></xs:complexType></xs:element></xs:schema>");
     cache->add(_bstr_t("urn:w"), _variant_t(wrapper));
     auto wrapped = [](const std::string& path) {
         std::string text = ReadFile(path);

@@ -83,8 +83,8 @@ bool LocalHttpServer::Start(const std::string& directory) {
         return false;
     }
     std::string port = std::to_string(m_port);
-    std::vector<std::string> args = {"python3",     "-m",     "http.server", "--bind",
-                                     "127.0.0.1",   port,     "--directory", directory};
+    std::vector<std::string> args = {"python3",   "-m", "http.server", "--bind",
+                                     "127.0.0.1", port, "--directory", directory};
     std::vector<char*> argv;
     for (auto& arg : args) argv.push_back(arg.data());
     argv.push_back(nullptr);

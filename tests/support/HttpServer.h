@@ -1,8 +1,9 @@
 #pragma once
 // Local servers for tests that fetch over http. They listen on 127.0.0.1 only, on a free port.
 
-#include <string>
 #include <sys/types.h>
+
+#include <string>
 
 namespace kest {
 namespace test {
@@ -12,7 +13,7 @@ namespace test {
 /// destructor stops it. When python3 is missing or the server does not come up, Started() is
 /// false and Error() says why, so a test can skip.
 class LocalHttpServer {
-public:
+  public:
     explicit LocalHttpServer(const std::string& directory);
     ~LocalHttpServer();
     LocalHttpServer(const LocalHttpServer&) = delete;
@@ -24,7 +25,7 @@ public:
     /// "http://127.0.0.1:<port>/<file>" (file relative to the served directory).
     std::string Url(const std::string& file) const;
 
-private:
+  private:
     bool Start(const std::string& directory);
     void Stop() noexcept;
 
@@ -36,7 +37,7 @@ private:
 /// A socket on 127.0.0.1 that accepts connections into its backlog and never answers, for
 /// testing timeouts.
 class SilentServer {
-public:
+  public:
     SilentServer();
     ~SilentServer();
     SilentServer(const SilentServer&) = delete;
@@ -45,7 +46,7 @@ public:
     bool Started() const noexcept { return m_socket >= 0; }
     std::string Url(const std::string& file) const;
 
-private:
+  private:
     int m_socket = -1;
     int m_port = 0;
 };
