@@ -159,6 +159,14 @@ TEST(KestCdfValueListCodec, FormatsLikePrintfWithThreeExponentDigits) {
         {std::numeric_limits<double>::quiet_NaN(), "nan"},
         {-std::numeric_limits<double>::quiet_NaN(), "-nan"},
         {std::numeric_limits<double>::denorm_min(), "4.94065645841247e-324"},
+        {1e-310, "9.99999999999997e-311"},
+        {std::numeric_limits<double>::max(), "1.79769313486232e+308"},
+        {std::numeric_limits<double>::min(), "2.2250738585072e-308"},
+        {123456789012345.0, "123456789012345"},
+        {1234567890123456.0, "1.23456789012346e+015"},
+        {100000000000000.0, "100000000000000"},
+        {0.000123, "0.000123"},
+        {0.0000123, "1.23e-005"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.text);
@@ -175,6 +183,22 @@ TEST(KestCdfValueListCodec, FormatsRandomDoublesLikePrintf) {
         if (i % 3 == 0) bits &= 0x800FFFFFFFFFFFFFull | (std::uint64_t(1000 + i % 100) << 52);
         std::memcpy(&value, &bits, sizeof value);
         ASSERT_EQ(ReferenceFormat(value), Format(value)) << std::hexfloat << value;
+    }
+}
+
+TEST(KestCdfValueListCodec, FormatsRandomShortDecimalsLikePrintf) {
+    // Doubles read from texts of up to 17 digits at every magnitude, the values files hold.
+    std::mt19937_64 random(11u);
+    std::uniform_int_distribution<int> digits(1, 17);
+    std::uniform_int_distribution<int> exponent(-30, 30);
+    for (int i = 0; i < 200000; ++i) {
+        char text[64];
+        std::uint64_t mantissa = random() % 100000000000000000ull;
+        if (i % 2) mantissa %= 1000;
+        std::snprintf(text, sizeof text, "%s%.*llue%d", (i % 3) ? "" : "-", digits(random),
+                      static_cast<unsigned long long>(mantissa), exponent(random));
+        const double value = ReferenceAtof(text);
+        ASSERT_EQ(ReferenceFormat(value), Format(value)) << text;
     }
 }
 
