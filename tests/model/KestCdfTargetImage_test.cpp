@@ -72,15 +72,5 @@ TEST(KestCdfTargetImage, AccessorsDifferFromTheSymbolicFileOnlyWhereDocumented) 
     EXPECT_STREQ(buffer, "0x00000ABC");
 }
 
-TEST(KestCdfTargetImage, CopiesAreIndependent) {
-    KestCdfTargetImage image;
-    image.SetTargetImage(Ns(u"a\tb"));
-    image.SetCrc(5);
-    KestCdfTargetImage copy = image;
-    image.SetTargetImage(Ns(u"other"));
-    EXPECT_EQ(Utf8(copy.GetTargetImage()), "a\tb");
-    EXPECT_EQ(copy.GetCrc(), 5);
-}
-
 }  // namespace
 }  // namespace kest
