@@ -4,6 +4,7 @@
 #include <pthread.h>
 #include <stdlib.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -68,9 +69,12 @@ std::string CalData(const std::string& fileName) {
 std::string Str(const CComBSTR& text) { return text == nullptr ? "<null>" : text.ToString(); }
 std::string Str(const KestCdfNormalizedString& text) { return Str(text.m_string); }
 
+long ElementCount(const _variant_t& value);
+
 void ExpectSameValue(const _variant_t& a, const _variant_t& b, const std::string& what) {
     EXPECT_EQ(a.vt, b.vt) << what;
-    EXPECT_TRUE(a == b) << what;
+    EXPECT_TRUE(a == b) << what << ": " << ElementCount(a) << " elements before, "
+                        << ElementCount(b) << " after";
 }
 
 // Field by field, everything a file carries.
@@ -111,8 +115,8 @@ void ExpectSameTree(const KestCdfCalData& a, const KestCdfCalData& b) {
         EXPECT_EQ(la.GetTargetImage().GetCrc(), lb.GetTargetImage().GetCrc());
         ASSERT_EQ(la.GetCalItemSize(), lb.GetCalItemSize());
         for (int j = 0; j < la.GetCalItemSize(); ++j) {
-            SCOPED_TRACE("item " + std::to_string(j));
             const KestCdfCalItem& ia = la.GetCalItems()[j];
+            SCOPED_TRACE("item " + std::to_string(j) + " " + Str(ia.GetName()));
             const KestCdfCalItem& ib = lb.GetCalItems()[j];
             EXPECT_EQ(Str(ia.GetName()), Str(ib.GetName()));
             EXPECT_EQ(Str(ia.GetAnnotation()), Str(ib.GetAnnotation()));
@@ -378,8 +382,13 @@ TEST(KestCalmorph, ReadWriteReadKeepsEveryField) {
 
     ASSERT_TRUE(writer.ConvertCPPToXML(reread, CComBSTR(dir / "second.cdf"), CComBSTR(u"pass 1")));
     std::string first = ReadFile(dir / "first.cdf");
+    std::string second = ReadFile(dir / "second.cdf");
     EXPECT_FALSE(first.empty());
-    EXPECT_EQ(first, ReadFile(dir / "second.cdf"));
+    auto diverge = std::mismatch(first.begin(), first.end(), second.begin(), second.end());
+    std::size_t at = static_cast<std::size_t>(diverge.first - first.begin());
+    EXPECT_TRUE(first == second) << "the files differ from byte " << at << ": \""
+                                 << first.substr(at < 40 ? 0 : at - 40, 80) << "\" vs \""
+                                 << second.substr(at < 40 ? 0 : at - 40, 80) << "\"";
 }
 
 TEST(KestCalmorph, WrittenFileStartsWithDeclarationAndComment) {
