@@ -24,7 +24,7 @@ bool IsSkippedSubtree(const _bstr_t& name) noexcept {
 // Clears the converter's write-document field and current node when a write ends, however it
 // ends, so that neither outlives the document of that call.
 class WriteScope {
-public:
+  public:
     WriteScope(IXMLDOMDocument*& document, IXMLDOMNodePtr& currentNode) noexcept
         : m_document(document), m_currentNode(currentNode) {}
     ~WriteScope() {
@@ -34,7 +34,7 @@ public:
     WriteScope(const WriteScope&) = delete;
     WriteScope& operator=(const WriteScope&) = delete;
 
-private:
+  private:
     IXMLDOMDocument*& m_document;
     IXMLDOMNodePtr& m_currentNode;
 };
@@ -201,9 +201,8 @@ bool KestCalmorph::ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CCo
 
 void KestCalmorph::CreateXMLEnvironment() {
     if (!m_writeDocument) throw _com_error(E_POINTER);
-    IXMLDOMNodePtr declaration =
-        m_writeDocument->createNode(_variant_t(static_cast<int>(NODE_PROCESSING_INSTRUCTION)),
-                                    _bstr_t(u"xml"), _bstr_t(u""));
+    IXMLDOMNodePtr declaration = m_writeDocument->createNode(
+        _variant_t(static_cast<int>(NODE_PROCESSING_INSTRUCTION)), _bstr_t(u"xml"), _bstr_t(u""));
     IXMLDOMNamedNodeMapPtr pseudoAttributes = declaration->Getattributes();
     if (!pseudoAttributes) throw _com_error(E_POINTER);
     IXMLDOMAttributePtr encoding = m_writeDocument->createAttribute(_bstr_t(u"encoding"));

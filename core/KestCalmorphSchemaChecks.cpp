@@ -46,7 +46,8 @@ bool KestCalmorph::IsMSXML4Installed() {
             IXMLDOMDocument2Ptr document;
             if (SUCCEEDED(document.CreateInstance(kProgIdDOMDocument40))) {
                 document->Putasync(VARIANT_FALSE);
-                usable = document->loadXML(_bstr_t(u"<probe a=\"1\"><x/></probe>")) != VARIANT_FALSE;
+                usable =
+                    document->loadXML(_bstr_t(u"<probe a=\"1\"><x/></probe>")) != VARIANT_FALSE;
             }
         }
     } catch (...) {
@@ -152,14 +153,16 @@ CComBSTR KestCalmorph::ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR 
         if (schema->load(_variant_t(static_cast<const OLECHAR*>(schemaPath))) != VARIANT_FALSE) {
             IXMLDOMSchemaCollectionPtr cache;
             cache.CreateInstance(kProgIdXMLSchemaCache40);
-            cache->add(_bstr_t(kCdfNamespaceURI), _variant_t(static_cast<const OLECHAR*>(schemaPath)));
+            cache->add(_bstr_t(kCdfNamespaceURI),
+                       _variant_t(static_cast<const OLECHAR*>(schemaPath)));
             data->putref_schemas(cache);
             IXMLDOMParseErrorPtr result = data->validate();
             message = CComBSTR(result->Getreason().View());
         } else {
             IXMLDOMParseErrorPtr parseError = data->GetparseError();
             if (!parseError) throw E_POINTER;
-            if (parseError->GeterrorCode() == 0) KestCalmorphDLLError::Raise(reason::kSchemaNotLoaded);
+            if (parseError->GeterrorCode() == 0)
+                KestCalmorphDLLError::Raise(reason::kSchemaNotLoaded);
             message = CComBSTR(parseError->Getreason().View());
         }
     } else {

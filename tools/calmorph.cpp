@@ -1,7 +1,6 @@
 // calmorph: looks into, converts and validates CDF calibration files from the command line.
 
 #include <kest/calmorph.h>
-
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -64,11 +63,14 @@ std::string Printable(const std::string& text) {
     std::string out;
     out.reserve(text.size());
     for (char c : text) {
-        switch (c) {
-        case '\n': out += "\\n"; break;
-        case '\r': out += "\\r"; break;
-        case '\t': out += "\\t"; break;
-        default: out += c; break;
+        if (c == '\n') {
+            out += "\\n";
+        } else if (c == '\r') {
+            out += "\\r";
+        } else if (c == '\t') {
+            out += "\\t";
+        } else {
+            out += c;
         }
     }
     return out;
@@ -93,45 +95,53 @@ std::string HexCode(HRESULT hr) {
     return buffer;
 }
 
+struct ReasonText {
+    int code;
+    const char* text;
+};
+
+constexpr ReasonText kReasonTexts[] = {
+    {0, "CAL-DATA was not converted"},
+    {11, "an AXIS attribute is missing"},
+    {12, "a CAL-ITEM could not be read"},
+    {13, "the document could not be walked"},
+    {14, "a CAL-LIST could not be read"},
+    {15, "CAL-DATA could not be read"},
+    {16, "a CAL-DATA attribute is not an attribute node"},
+    {17, "the TARGET-IMAGE attribute is not an attribute node"},
+    {18, "SYMBOLIC-FILE has no crc32 attribute"},
+    {19, "a VALUE attribute is not an attribute node"},
+    {20, "an AXIS element has no attributes"},
+    {21, "the XML service refused a new element"},
+    {22, "a new element could not be created"},
+    {23, "the schema-instance namespace (xmlns:xsi) is not set"},
+    {24, "the schema location is not set"},
+    {25, "a calibration list has no symbolic file"},
+    {26, "an axis has no value"},
+    {27, "an AXIS element has no attribute map"},
+    {29, "an item has no value"},
+    {30, "a calibration list has no name"},
+    {31, "an item has no name"},
+    {32, "the item count of a list is not set"},
+    {33, "the change count is not set"},
+    {34, "a year is out of range (1900..2300)"},
+    {35, "a month is out of range"},
+    {36, "a day is out of range"},
+    {37, "an hour is out of range"},
+    {38, "a minute is out of range"},
+    {39, "a second is out of range"},
+    {40, "a date text has the wrong length"},
+    {41, "CAL-DATA has no attributes"},
+    {42, "CAL-DATA lacks one of its three attributes (xmlns, xmlns:xsi, schema location)"},
+    {44, "the schema file cannot be loaded"},
+    {45, "the root names no schema (no xsi:schemaLocation)"},
+};
+
 const char* ReasonMeaning(int code) {
-    switch (code) {
-    case 0: return "CAL-DATA was not converted";
-    case 11: return "an AXIS attribute is missing";
-    case 12: return "a CAL-ITEM could not be read";
-    case 13: return "the document could not be walked";
-    case 14: return "a CAL-LIST could not be read";
-    case 15: return "CAL-DATA could not be read";
-    case 16: return "a CAL-DATA attribute is not an attribute node";
-    case 17: return "the TARGET-IMAGE attribute is not an attribute node";
-    case 18: return "SYMBOLIC-FILE has no crc32 attribute";
-    case 19: return "a VALUE attribute is not an attribute node";
-    case 20: return "an AXIS element has no attributes";
-    case 21: return "the XML service refused a new element";
-    case 22: return "a new element could not be created";
-    case 23: return "the schema-instance namespace (xmlns:xsi) is not set";
-    case 24: return "the schema location is not set";
-    case 25: return "a calibration list has no symbolic file";
-    case 26: return "an axis has no value";
-    case 27: return "an AXIS element has no attribute map";
-    case 29: return "an item has no value";
-    case 30: return "a calibration list has no name";
-    case 31: return "an item has no name";
-    case 32: return "the item count of a list is not set";
-    case 33: return "the change count is not set";
-    case 34: return "a year is out of range (1900..2300)";
-    case 35: return "a month is out of range";
-    case 36: return "a day is out of range";
-    case 37: return "an hour is out of range";
-    case 38: return "a minute is out of range";
-    case 39: return "a second is out of range";
-    case 40: return "a date text has the wrong length";
-    case 41: return "CAL-DATA has no attributes";
-    case 42: return "CAL-DATA lacks one of its three attributes "
-                    "(xmlns, xmlns:xsi, schema location)";
-    case 44: return "the schema file cannot be loaded";
-    case 45: return "the root names no schema (no xsi:schemaLocation)";
-    default: return "unknown reason";
+    for (const ReasonText& reason : kReasonTexts) {
+        if (reason.code == code) return reason.text;
     }
+    return "unknown reason";
 }
 
 void ReportConversionError(const std::string& file, const KestCalmorphDLLError& error) {
@@ -336,7 +346,8 @@ int CommandInfo(const std::vector<std::string>& args) {
         } else if (file.empty()) {
             file = arg;
         } else {
-            std::fprintf(stderr, "calmorph: info: one file only (extra argument %s)\n", arg.c_str());
+            std::fprintf(stderr, "calmorph: info: one file only (extra argument %s)\n",
+                         arg.c_str());
             return kExitUsage;
         }
     }
@@ -371,8 +382,9 @@ int CommandConvert(const std::vector<std::string>& args) {
         }
     }
     if (files.size() != 2) {
-        std::fprintf(stderr, "calmorph: convert: needs IN and OUT\n"
-                             "usage: calmorph convert IN OUT [--comment TEXT]\n");
+        std::fprintf(stderr,
+                     "calmorph: convert: needs IN and OUT\n"
+                     "usage: calmorph convert IN OUT [--comment TEXT]\n");
         return kExitUsage;
     }
     const std::string& in = files[0];
@@ -471,7 +483,8 @@ int ValidateAgainstSchemaFile(KestCalmorph& converter, const std::string& file,
         message = converter.ValidateXMLFileWithLocaleXSD(CComBSTR(file), CComBSTR(schema));
     } catch (const KestCalmorphDLLError& error) {
         if (error.GetReason() == reason::kSchemaNotLoaded) {
-            std::fprintf(stderr, "calmorph: %s: the schema file cannot be loaded\n", schema.c_str());
+            std::fprintf(stderr, "calmorph: %s: the schema file cannot be loaded\n",
+                         schema.c_str());
         } else {
             ReportConversionError(file, error);
         }
@@ -526,8 +539,9 @@ int CommandValidate(const std::vector<std::string>& args) {
         }
     }
     if (files.empty()) {
-        std::fprintf(stderr, "calmorph: validate: missing FILE\n"
-                             "usage: calmorph validate FILE... [--schema XSD]\n");
+        std::fprintf(stderr,
+                     "calmorph: validate: missing FILE\n"
+                     "usage: calmorph validate FILE... [--schema XSD]\n");
         return kExitUsage;
     }
     KestCalmorph converter;
@@ -542,8 +556,9 @@ int CommandValidate(const std::vector<std::string>& args) {
 
 int CommandSchemaLocation(const std::vector<std::string>& args) {
     if (args.size() != 1 || (args[0].size() > 1 && args[0][0] == '-')) {
-        std::fprintf(stderr, "calmorph: schema-location: needs exactly one FILE\n"
-                             "usage: calmorph schema-location FILE\n");
+        std::fprintf(stderr,
+                     "calmorph: schema-location: needs exactly one FILE\n"
+                     "usage: calmorph schema-location FILE\n");
         return kExitUsage;
     }
     const std::string& file = args[0];

@@ -1,6 +1,5 @@
 // The converter's schema checks: service probe, schema location, reachability and validation.
 #include <gtest/gtest.h>
-
 #include <stdlib.h>
 #include <unistd.h>
 
@@ -22,7 +21,7 @@ const std::string kSchema = std::string(KEST_SOURCE_DIR) + "/schema/cdf.xsd";
 constexpr const char* kCdfNs = "http://kest.dev/schemas/cdf/1.0";
 
 class TempDir {
-public:
+  public:
     TempDir() {
         std::string pattern = (fs::temp_directory_path() / "kest-schema-XXXXXX").string();
         if (!mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp failed");
@@ -35,19 +34,19 @@ public:
     std::string operator/(const std::string& name) const { return (m_path / name).string(); }
     const fs::path& path() const { return m_path; }
 
-private:
+  private:
     fs::path m_path;
 };
 
 // Changes the current directory for the life of the object.
 class CurrentDirectory {
-public:
+  public:
     explicit CurrentDirectory(const fs::path& directory) : m_previous(fs::current_path()) {
         fs::current_path(directory);
     }
     ~CurrentDirectory() { fs::current_path(m_previous); }
 
-private:
+  private:
     fs::path m_previous;
 };
 
@@ -146,8 +145,8 @@ TEST(KestCalmorphSchemaChecks, DetectsTheLocationAfterTheFirstBlank) {
         {"two pairs", CdfAt(std::string(kCdfNs) + " cdf.xsd urn:other other.xsd"),
          "cdf.xsd urn:other other.xsd"},
         {"a location alone", CdfAt("cdf.xsd"), "cdf.xsd"},
-        {"longer than any fixed buffer", CdfAt(std::string(kCdfNs) + " " + longDirectory + "/cdf.xsd"),
-         longDirectory + "/cdf.xsd"},
+        {"longer than any fixed buffer",
+         CdfAt(std::string(kCdfNs) + " " + longDirectory + "/cdf.xsd"), longDirectory + "/cdf.xsd"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
@@ -227,8 +226,8 @@ TEST(KestCalmorphSchemaChecks, LocalLocationsAreLookedUpWhereTheyBelong) {
          withoutSchemas, true},
         {"cdf.xsd only in the current directory", CComBSTR(u"cdf.xsd"), dir / "alone/data.cdf",
          withSchemas, false},
-        {"data path without separator uses the current directory", CComBSTR(u"cdf.xsd"),
-         "data.cdf", withSchemas, true},
+        {"data path without separator uses the current directory", CComBSTR(u"cdf.xsd"), "data.cdf",
+         withSchemas, true},
         {"data path without separator, nothing there", CComBSTR(u"cdf.xsd"), "data.cdf",
          withoutSchemas, false},
         {"CDF.XSD is a path of its own, not the conventional name", CComBSTR(u"CDF.XSD"),
@@ -238,10 +237,9 @@ TEST(KestCalmorphSchemaChecks, LocalLocationsAreLookedUpWhereTheyBelong) {
         {"relative path against the current directory", CComBSTR(u"schemas/other.xsd"),
          dir / "beside/data.cdf", withSchemas, true},
         {"absolute path", CComBSTR((dir / "beside/cdf.xsd").c_str()), "", withoutSchemas, true},
-        {"absolute path, missing", CComBSTR((dir / "beside/none.xsd").c_str()), "",
-         withoutSchemas, false},
-        {"a directory is no schema", CComBSTR((dir / "beside").c_str()), "", withoutSchemas,
+        {"absolute path, missing", CComBSTR((dir / "beside/none.xsd").c_str()), "", withoutSchemas,
          false},
+        {"a directory is no schema", CComBSTR((dir / "beside").c_str()), "", withoutSchemas, false},
         {"empty location", CComBSTR(u""), dir / "beside/data.cdf", withSchemas, false},
         {"null location", CComBSTR(), dir / "beside/data.cdf", withSchemas, false},
         {"upper-case HTTP is a file path", CComBSTR(u"HTTP://host/cdf.xsd"),
@@ -347,8 +345,9 @@ TEST(KestCalmorphSchemaChecks, SchemaFileProblemsThrow) {
     }
 
     KestCalmorph converter;
-    EXPECT_THROW(converter.ValidateXMLFileWithLocaleXSD(CComBSTR(data), CComBSTR(dir / "foreign.xsd")),
-                 _com_error);
+    EXPECT_THROW(
+        converter.ValidateXMLFileWithLocaleXSD(CComBSTR(data), CComBSTR(dir / "foreign.xsd")),
+        _com_error);
     try {
         converter.ValidateXMLFileWithLocaleXSD(CComBSTR(), CComBSTR(kSchema.c_str()));
         ADD_FAILURE() << "no error";

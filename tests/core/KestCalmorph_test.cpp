@@ -1,6 +1,7 @@
 // The converter's read and write pipelines, driven through files.
-#include <gtest/gtest.h>
+#include "core/KestCalmorph.h"
 
+#include <gtest/gtest.h>
 #include <pthread.h>
 #include <stdlib.h>
 
@@ -11,7 +12,6 @@
 #include <sstream>
 #include <string>
 
-#include "core/KestCalmorph.h"
 #include "model/KestCdfCalData.h"
 
 namespace fs = std::filesystem;
@@ -23,7 +23,7 @@ const std::string kExamples = std::string(KEST_SOURCE_DIR) + "/examples";
 const std::string kSample = kExamples + "/sample.cdf";
 
 class TempDir {
-public:
+  public:
     TempDir() {
         std::string pattern = (fs::temp_directory_path() / "kest-calmorph-XXXXXX").string();
         if (!mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp failed");
@@ -36,7 +36,7 @@ public:
     std::string operator/(const std::string& name) const { return (m_path / name).string(); }
     const fs::path& path() const { return m_path; }
 
-private:
+  private:
     fs::path m_path;
 };
 
@@ -260,8 +260,9 @@ TEST(KestCalmorph, ConvertsCalDataOutsideChangeHistoryAndItemsOnly) {
          "<wrapper><CAL-ITEM><x><y>" + CalData("item") + "</y></x></CAL-ITEM></wrapper>", nullptr},
         {"inside CHANGE-HISTORY",
          "<wrapper><CHANGE-HISTORY>" + CalData("history") + "</CHANGE-HISTORY></wrapper>", nullptr},
-        {"prefixed name is another element", "<wrapper><p:CAL-DATA xmlns:p=\"urn:p\" a=\"1\" "
-                                             "b=\"2\"><FILENAME>p</FILENAME></p:CAL-DATA></wrapper>",
+        {"prefixed name is another element",
+         "<wrapper><p:CAL-DATA xmlns:p=\"urn:p\" a=\"1\" "
+         "b=\"2\"><FILENAME>p</FILENAME></p:CAL-DATA></wrapper>",
          nullptr},
         {"second in document order wins",
          "<wrapper>" + CalData("first") + "<g>" + CalData("second") + "</g></wrapper>", "second"},
@@ -290,7 +291,8 @@ TEST(KestCalmorph, ConversionErrorsLeaveWithTheirCodeAndKeepTheMessage) {
         std::string document;
         int reason;
     } rows[] = {
-        {"root with two attributes", "<CAL-DATA a=\"1\" b=\"2\"/>", reason::kCalDataAttributeMissing},
+        {"root with two attributes", "<CAL-DATA a=\"1\" b=\"2\"/>",
+         reason::kCalDataAttributeMissing},
         {"nested root with two attributes", "<w><g><CAL-DATA a=\"1\" b=\"2\"/></g></w>",
          reason::kCalDataAttributeMissing},
         {"nested root without attributes", "<w><CAL-DATA/></w>", reason::kCalDataAttributeMissing},

@@ -1,6 +1,5 @@
 // The calmorph command-line tool, run as a separate process: exit codes, output, messages.
 #include <gtest/gtest.h>
-
 #include <stdlib.h>
 #include <sys/wait.h>
 
@@ -20,7 +19,7 @@ const std::string kGolden = std::string(KEST_TEST_DATA_DIR) + "/calmorph";
 constexpr const char* kCdfNs = "http://kest.dev/schemas/cdf/1.0";
 
 class TempDir {
-public:
+  public:
     TempDir() {
         std::string pattern = (fs::temp_directory_path() / "kest-tool-XXXXXX").string();
         if (!mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp failed");
@@ -33,7 +32,7 @@ public:
     std::string operator/(const std::string& name) const { return (m_path / name).string(); }
     std::string str() const { return m_path.string(); }
 
-private:
+  private:
     fs::path m_path;
 };
 
@@ -204,7 +203,7 @@ TEST(Calmorph, InfoFailuresNameTheFileAndWhere) {
 TEST(Calmorph, ConvertWritesAValidFileWithTheComment) {
     Files files;
     Result result = RunTool({"convert", "sample.cdf", "out.cdf", "--comment", "from the test"},
-                        files.dir.str());
+                            files.dir.str());
     EXPECT_EQ(result.code, 0);
     EXPECT_EQ(result.out + result.err, "");
     std::string text = ReadFile(files.dir / "out.cdf");
@@ -258,30 +257,53 @@ TEST(Calmorph, ValidateReportsEachFile) {
         std::vector<std::string> out;
         std::vector<std::string> err;
     } rows[] = {
-        {"valid against the schema it names", {"validate", "sample.cdf"}, 0,
-         {"sample.cdf: valid against cdf.xsd\n"}, {}},
-        {"invalid", {"validate", "invalid.cdf"}, 3, {},
+        {"valid against the schema it names",
+         {"validate", "sample.cdf"},
+         0,
+         {"sample.cdf: valid against cdf.xsd\n"},
+         {}},
+        {"invalid",
+         {"validate", "invalid.cdf"},
+         3,
+         {},
          {"calmorph: invalid.cdf:2", "not valid against cdf.xsd", "FILENAME"}},
         {"malformed", {"validate", "malformed.cdf"}, 2, {}, {"calmorph: malformed.cdf:2:"}},
         {"names no schema", {"validate", "unnamed.cdf"}, 6, {}, {"unnamed.cdf: names no schema"}},
         {"named schema missing", {"validate", "elsewhere.cdf"}, 2, {}, {"nowhere.xsd"}},
-        {"several files: the highest code", {"validate", "sample.cdf", "invalid.cdf", "malformed.cdf"},
-         3, {"sample.cdf: valid"}, {"invalid.cdf:2", "malformed.cdf:2:"}},
-        {"given schema", {"validate", "sample.cdf", "elsewhere.cdf", "--schema", "cdf.xsd"}, 0,
-         {"sample.cdf: valid against cdf.xsd\n", "elsewhere.cdf: valid against cdf.xsd\n"}, {}},
-        {"given schema, invalid file", {"validate", "--schema", "cdf.xsd", "invalid.cdf"}, 3, {},
+        {"several files: the highest code",
+         {"validate", "sample.cdf", "invalid.cdf", "malformed.cdf"},
+         3,
+         {"sample.cdf: valid"},
+         {"invalid.cdf:2", "malformed.cdf:2:"}},
+        {"given schema",
+         {"validate", "sample.cdf", "elsewhere.cdf", "--schema", "cdf.xsd"},
+         0,
+         {"sample.cdf: valid against cdf.xsd\n", "elsewhere.cdf: valid against cdf.xsd\n"},
+         {}},
+        {"given schema, invalid file",
+         {"validate", "--schema", "cdf.xsd", "invalid.cdf"},
+         3,
+         {},
          {"calmorph: invalid.cdf: not valid against cdf.xsd", "FILENAME"}},
-        {"given schema, malformed file", {"validate", "--schema", "cdf.xsd", "malformed.cdf"}, 2,
-         {}, {"calmorph: malformed.cdf:2:"}},
-        {"given schema missing", {"validate", "--schema", "none.xsd", "sample.cdf"}, 2, {},
+        {"given schema, malformed file",
+         {"validate", "--schema", "cdf.xsd", "malformed.cdf"},
+         2,
+         {},
+         {"calmorph: malformed.cdf:2:"}},
+        {"given schema missing",
+         {"validate", "--schema", "none.xsd", "sample.cdf"},
+         2,
+         {},
          {"calmorph: none.xsd: the schema file cannot be loaded"}},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
         Result result = RunTool(row.args, files.dir.str());
         EXPECT_EQ(result.code, row.code) << result.err;
-        for (const std::string& part : row.out) EXPECT_TRUE(Contains(result.out, part)) << result.out;
-        for (const std::string& part : row.err) EXPECT_TRUE(Contains(result.err, part)) << result.err;
+        for (const std::string& part : row.out)
+            EXPECT_TRUE(Contains(result.out, part)) << result.out;
+        for (const std::string& part : row.err)
+            EXPECT_TRUE(Contains(result.err, part)) << result.err;
         if (row.out.empty()) {
             EXPECT_EQ(result.out, "");
         }
