@@ -367,6 +367,23 @@ TEST(KestCalmorph, WalksDeeplyNestedDocumentsWithoutRecursion) {
     EXPECT_EQ(fileName, "deepest");
 }
 
+TEST(KestCalmorph, NestingBeyondTheLoaderLimitIsALoadFailure) {
+    const int depth = 100000;
+    std::string document;
+    for (int i = 0; i < depth; ++i) document += "<d>";
+    document += CalData("too deep");
+    for (int i = 0; i < depth; ++i) document += "</d>";
+    TempDir dir;
+    WriteFile(dir / "deeper.xml", document);
+
+    KestCalmorph converter;
+    Read(converter, kSample);
+    CComBSTR message;
+    KestCdfCalData data = converter.ConvertXMLtoCPP(CComBSTR(dir / "deeper.xml"), true, message);
+    EXPECT_NE(message.Length(), 0u);
+    EXPECT_EQ(Str(data.GetFileName()), "EC16_base.cdf");
+}
+
 // --------------------------------------------------------------------------------------------
 // Writing
 
