@@ -39,12 +39,14 @@ public:
     void SetFormatType(KestCdfNormalizedString formatType) { m_formatType = formatType; }
 
     /// Reads an AXIS element: its first three attributes by position (size, units, format
-    /// type), then the value of its last child node. Throws KestCalmorphDLLError 20 without an
+    /// type), then the value of its last child node. The size text is read as a number,
+    /// truncated toward zero, and its low 32 bits kept (-1 gives 4294967295); a number beyond
+    /// the 64-bit range saturates at that range's limits first. Throws KestCalmorphDLLError 20 without an
     /// attribute map, 11 when an attribute is missing; _com_error for an absent node or a size
     /// that is no number. Returns true.
     bool ConvertAxisNode(IXMLDOMNodePtr node);
-    /// Appends a new AXIS element (namespace `ns`) to `parent` with the attributes size,
-    /// sw-units and format-type and the points as text. Throws KestCalmorphDLLError 27 when the
+    /// Appends a new AXIS element (namespace `ns`) to `parent` with the attributes size (as a
+    /// signed 32-bit number), sw-units and format-type and the points as text. Throws KestCalmorphDLLError 27 when the
     /// new element has no attribute map and 26 when the value is VT_EMPTY (the element stays
     /// attached); _com_error for an absent parent or document. Returns true.
     bool ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,

@@ -2,7 +2,6 @@
 
 #include <charconv>
 #include <climits>
-#include <cfloat>
 #include <cmath>
 #include <cstring>
 #include <locale.h>
@@ -57,59 +56,6 @@ double ParseDoubleSlow(const char* first, const char* last) noexcept {
         text = large.c_str();
     }
     return cLocale ? strtod_l(text, nullptr, cLocale) : strtod(text, nullptr);
-}
-
-// "%.15g" for the doubles whose shortest round-trip form has at most 15 significant digits
-// (every normal double read from a decimal text of at most 15 digits): such a decimal survives the
-// trip through a double unchanged, so rounding the double to 15 digits gives exactly its
-// shortest digits, and only the %g layout remains to be done. The shortest form is several
-// times cheaper to produce than a fixed precision. Returns null for the other doubles.
-char* FormatShortDouble(double value, char* buffer) noexcept {
-    // Subnormal doubles carry fewer digits than that guarantee needs.
-    if (!std::isfinite(value) || (value != 0.0 && std::fabs(value) < DBL_MIN)) return nullptr;
-    char scientific[kDoubleTextCapacity];
-    const char* end =
-        std::to_chars(scientific, scientific + sizeof scientific, value, std::chars_format::scientific)
-            .ptr;
-    const char* p = scientific;
-    char* out = buffer;
-    if (*p == '-') *out++ = *p++;
-    char digits[20];
-    int count = 0;
-    for (; p != end && *p != 'e'; ++p) {
-        if (*p == '.') continue;
-        if (count == 15) return nullptr;
-        digits[count++] = *p;
-    }
-    int exponent = 0;
-    std::from_chars(p + (p[1] == '+' ? 2 : 1), end, exponent);  // "e+XX" or "e-XX"
-    if (exponent < -4 || exponent >= 15) {
-        // The same form as printf's, apart from the exponent's width.
-        const std::size_t length = static_cast<std::size_t>(end - p);
-        *out++ = digits[0];
-        if (count > 1) {
-            *out++ = '.';
-            std::memcpy(out, digits + 1, static_cast<std::size_t>(count - 1));
-            out += count - 1;
-        }
-        std::memcpy(out, p, length);
-        return out + length;
-    }
-    if (exponent < 0) {
-        *out++ = '0';
-        *out++ = '.';
-        for (int i = -1; i > exponent; --i) *out++ = '0';
-        std::memcpy(out, digits, static_cast<std::size_t>(count));
-        return out + count;
-    }
-    const int whole = exponent + 1;
-    for (int i = 0; i < whole; ++i) *out++ = i < count ? digits[i] : '0';
-    if (count > whole) {
-        *out++ = '.';
-        std::memcpy(out, digits + whole, static_cast<std::size_t>(count - whole));
-        out += count - whole;
-    }
-    return out;
 }
 
 void CheckArray(const VARIANT& array) {
@@ -394,8 +340,14 @@ double ParseDouble(const char* first, const char* last) noexcept {
 }
 
 char* FormatDouble(double value, char* buffer) noexcept {
-    char* end = FormatShortDouble(value, buffer);
-    if (!end) {
+    char* end;
+    const bool negativeZero = value == 0.0 && std::signbit(value);
+    if (std::fabs(value) < 1e15 && value == std::trunc(value) && !negativeZero) {
+        // Whole numbers below 10^15 (axis points, counts) are written by "%.15g" as the plain
+        // integer; the integer conversion is much cheaper than a fixed precision.
+        end = std::to_chars(buffer, buffer + kDoubleTextCapacity, static_cast<long long>(value))
+                  .ptr;
+    } else {
         end = std::to_chars(buffer, buffer + kDoubleTextCapacity, value,
                             std::chars_format::general, 15)
                   .ptr;
