@@ -45,9 +45,9 @@ void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes
 }  // namespace
 
 KestCdfCalList* KestCdfCalData::CreateCalList(int count) {
-    KestCdfCalList* lists = m_calLists.AllocateArray(count);
+    m_calLists.AllocateArray(count);
     m_calListLength = count;
-    return lists;
+    return m_calLists.Expose();
 }
 
 void KestCdfCalData::SetCalLists(KestCdfCalList* lists) {

@@ -60,7 +60,7 @@ public:
     /// Assigns `list` to list 0 (same requirements as GetCalList).
     void SetCalList(KestCdfCalList list);
     /// The list array itself (null when there is none), to reach lists beyond the first.
-    KestCdfCalList* GetCalLists() const noexcept { return m_calLists.get(); }
+    KestCdfCalList* GetCalLists() const { return m_calLists.Expose(); }
     /// Refers to `lists` without copying; an array the host allocated stays the host's and
     /// must outlive every copy of the tree, one the library allocated is shared. Set the list
     /// size to match.

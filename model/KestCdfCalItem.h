@@ -40,7 +40,7 @@ public:
     /// must outlive every copy of the tree.
     void SetCalItemValue(KestCdfCalItemValue* value) { m_value.Set(value); }
     /// The axis array (null when there is none).
-    KestCdfAxis* GetAxis() const noexcept { return m_axes.get(); }
+    KestCdfAxis* GetAxis() const { return m_axes.Expose(); }
     /// Refers to `axes` without copying (ownership as for SetCalItemValue).
     void SetAxis(KestCdfAxis* axes) { m_axes.Set(axes); }
     /// Number of axes the writer emits; must not exceed the array's length.
@@ -48,7 +48,10 @@ public:
     void SetAxisSize(int size) noexcept { m_axisSize = size; }
     /// Allocates `count` default axes, refers to them and returns them; the axis size is not
     /// changed. A negative count throws std::bad_alloc.
-    KestCdfAxis* CreateAxisArray(int count) { return m_axes.AllocateArray(count); }
+    KestCdfAxis* CreateAxisArray(int count) {
+        m_axes.AllocateArray(count);
+        return m_axes.Expose();
+    }
 
     /// Reads CAL-ITEM: NAME (last child node), each AXIS into the next axis, VALUE into a new
     /// value object, ANNOTATION and NOTE (first child node), in any order. A KestCalmorphDLLError

@@ -42,7 +42,8 @@ KestCdfTargetImage KestCdfCalList::GetTargetImage() const {
 
 KestCdfCalItem* KestCdfCalList::CreateCalItems() {
     if (m_calItemSize == -1) KestCalmorphDLLError::Raise(reason::kCalItemSizeUnset);
-    return m_calItems.AllocateArray(m_calItemSize);
+    m_calItems.AllocateArray(m_calItemSize);
+    return m_calItems.Expose();
 }
 
 int KestCdfCalList::CountCalItem(IXMLDOMNodePtr node) {

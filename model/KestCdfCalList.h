@@ -41,7 +41,7 @@ public:
     /// Refers to `image` without copying (ownership as for SetSymbolicFile).
     void SetTargetImage(KestCdfTargetImage* image) { m_targetImage.Set(image); }
     /// The item array (null when there is none).
-    KestCdfCalItem* GetCalItems() const noexcept { return m_calItems.get(); }
+    KestCdfCalItem* GetCalItems() const { return m_calItems.Expose(); }
     /// Refers to `items` without copying (ownership as for SetSymbolicFile).
     void SetCalItems(KestCdfCalItem* items) { m_calItems.Set(items); }
     /// Number of items the writer emits (-1: not set); must not exceed the array's length.

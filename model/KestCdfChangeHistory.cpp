@@ -6,7 +6,8 @@ namespace kest {
 
 KestCdfChange* KestCdfChangeHistory::CreateChangeList() {
     if (m_count == -1) KestCalmorphDLLError::Raise(reason::kChangeCountUnset);
-    return m_changes.AllocateArray(m_count);
+    m_changes.AllocateArray(m_count);
+    return m_changes.Expose();
 }
 
 int KestCdfChangeHistory::CountChangeNodes(IXMLDOMNodePtr node) {

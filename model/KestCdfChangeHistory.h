@@ -19,7 +19,7 @@ public:
     ~KestCdfChangeHistory() = default;
 
     /// The entry array (null when there is none).
-    KestCdfChange* GetChange() const noexcept { return m_changes.get(); }
+    KestCdfChange* GetChange() const { return m_changes.Expose(); }
     /// Refers to `changes` without copying; an array the host allocated stays the host's and
     /// must outlive every copy of the tree.
     void SetChange(KestCdfChange* changes) { m_changes.Set(changes); }

@@ -10,7 +10,7 @@ namespace {
 // Trees may live on different threads, so the registry is guarded.
 struct Registry {
     std::mutex mutex;
-    std::unordered_map<const void*, std::weak_ptr<void>> entries;
+    std::unordered_map<const void*, std::weak_ptr<SharedAllocation>> entries;
 };
 
 Registry& TheRegistry() {
@@ -20,23 +20,29 @@ Registry& TheRegistry() {
 
 }  // namespace
 
-std::shared_ptr<void> FindLibraryAllocation(const void* p) {
+SharedAllocation::~SharedAllocation() {
+    if (!m_published.load(std::memory_order_acquire)) return;
+    Registry& registry = TheRegistry();
+    std::lock_guard<std::mutex> lock(registry.mutex);
+    auto it = registry.entries.find(m_address);
+    // A newer allocation at the same address may already have replaced the entry.
+    if (it != registry.entries.end() && it->second.expired()) registry.entries.erase(it);
+}
+
+void SharedAllocation::Publish(const std::shared_ptr<SharedAllocation>& self) {
+    if (m_published.load(std::memory_order_acquire)) return;
+    Registry& registry = TheRegistry();
+    std::lock_guard<std::mutex> lock(registry.mutex);
+    if (m_published.load(std::memory_order_relaxed)) return;
+    registry.entries[m_address] = self;
+    m_published.store(true, std::memory_order_release);
+}
+
+std::shared_ptr<SharedAllocation> FindLibraryAllocation(const void* p) {
     Registry& registry = TheRegistry();
     std::lock_guard<std::mutex> lock(registry.mutex);
     auto it = registry.entries.find(p);
-    return it == registry.entries.end() ? std::shared_ptr<void>() : it->second.lock();
-}
-
-void RegisterLibraryAllocation(const void* p, const std::weak_ptr<void>& owner) {
-    Registry& registry = TheRegistry();
-    std::lock_guard<std::mutex> lock(registry.mutex);
-    registry.entries[p] = owner;
-}
-
-void UnregisterLibraryAllocation(const void* p) noexcept {
-    Registry& registry = TheRegistry();
-    std::lock_guard<std::mutex> lock(registry.mutex);
-    registry.entries.erase(p);
+    return it == registry.entries.end() ? std::shared_ptr<SharedAllocation>() : it->second.lock();
 }
 
 }  // namespace detail

@@ -5,70 +5,94 @@
 // keeps a share of every array or object it allocated (readers, Create* functions) beside the
 // pointer, so the last copy that refers to it frees it. A pointer a host hands to a setter stays
 // the host's, unless the library allocated it, in which case the new holder takes a share too.
+//
+// To know a library pointer when it comes back through a setter, the allocation is entered in a
+// process-wide registry, but only once the pointer has left the library (a getter or a Create*
+// function handed it out): pointers that never escape cost no registry work.
 
+#include <atomic>
 #include <memory>
 #include <new>
 
 namespace kest {
 namespace detail {
 
-/// The share of a library allocation that starts at `p`, or an empty one when the library did
-/// not allocate it (or it is already gone).
-std::shared_ptr<void> FindLibraryAllocation(const void* p);
-void RegisterLibraryAllocation(const void* p, const std::weak_ptr<void>& owner);
-void UnregisterLibraryAllocation(const void* p) noexcept;
+/// One library allocation; frees it (and leaves the registry) when the last share goes.
+class SharedAllocation {
+public:
+    virtual ~SharedAllocation();
+    const void* Address() const noexcept { return m_address; }
+    /// Enters the allocation in the registry once, so a setter can find it.
+    void Publish(const std::shared_ptr<SharedAllocation>& self);
+
+protected:
+    explicit SharedAllocation(const void* address) noexcept : m_address(address) {}
+
+private:
+    const void* m_address;
+    std::atomic<bool> m_published{false};
+};
+
+/// The share of a published library allocation that starts at `p`, or an empty one when the
+/// library did not hand it out (or it is already gone).
+std::shared_ptr<SharedAllocation> FindLibraryAllocation(const void* p);
+
+template <class T, bool IsArray>
+class TypedAllocation final : public SharedAllocation {
+public:
+    explicit TypedAllocation(T* p) noexcept : SharedAllocation(p), m_p(p) {}
+    ~TypedAllocation() override {
+        if (IsArray)
+            delete[] m_p;
+        else
+            delete m_p;
+    }
+
+private:
+    T* m_p;
+};
 
 template <class T>
 class SharedChild {
 public:
+    /// The pointer, for the library's own use.
     T* get() const noexcept { return m_ptr; }
 
+    /// The pointer, for handing out to a host: from now on a setter recognises it.
+    T* Expose() const {
+        if (m_owner) m_owner->Publish(m_owner);
+        return m_ptr;
+    }
+
     /// Allocates `count` default-constructed objects and holds them; the previous array is
-    /// dropped (freed when no other copy refers to it). A negative count throws std::bad_alloc.
+    /// dropped (freed when no other copy refers to it). A negative count throws
+    /// std::bad_array_new_length, the runtime's out-of-memory exception.
     T* AllocateArray(int count) {
         if (count < 0) throw std::bad_array_new_length();
-        T* array = new T[static_cast<std::size_t>(count)];
-        Adopt(array, [](T* p) {
-            UnregisterLibraryAllocation(p);
-            delete[] p;
-        });
-        return array;
+        std::unique_ptr<T[]> array(new T[static_cast<std::size_t>(count)]);
+        m_owner = std::make_shared<TypedAllocation<T, true>>(array.get());
+        m_ptr = array.release();
+        return m_ptr;
     }
 
     /// Allocates one default-constructed object and holds it.
     T* AllocateObject() {
-        T* object = new T();
-        Adopt(object, [](T* p) {
-            UnregisterLibraryAllocation(p);
-            delete p;
-        });
-        return object;
+        std::unique_ptr<T> object(new T());
+        m_owner = std::make_shared<TypedAllocation<T, false>>(object.get());
+        m_ptr = object.release();
+        return m_ptr;
     }
 
-    /// Stores a pointer given by a host: shared when the library allocated it, else borrowed.
+    /// Stores a pointer given by a host: shared when the library handed it out, else borrowed.
     void Set(T* p) {
         if (p == m_ptr) return;
-        m_owner = p ? FindLibraryAllocation(p) : std::shared_ptr<void>();
+        m_owner = p ? FindLibraryAllocation(p) : std::shared_ptr<SharedAllocation>();
         m_ptr = p;
     }
 
 private:
-    template <class Deleter>
-    void Adopt(T* p, Deleter deleter) {
-        std::shared_ptr<T> owner;
-        try {
-            owner = std::shared_ptr<T>(p, deleter);
-        } catch (...) {
-            // shared_ptr already ran the deleter on failure.
-            throw;
-        }
-        RegisterLibraryAllocation(p, owner);
-        m_owner = std::move(owner);
-        m_ptr = p;
-    }
-
     T* m_ptr = nullptr;
-    std::shared_ptr<void> m_owner;
+    std::shared_ptr<SharedAllocation> m_owner;
 };
 
 }  // namespace detail
