@@ -226,6 +226,8 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
         i = at + 1;
     }
     store(start, length);
+    // Keep the buffer for the next text unless one huge text made it grow.
+    if (narrow.capacity() > (std::size_t(1) << 22)) std::string().swap(narrow);
 }
 
 bool IsQuoted(std::u16string_view text) noexcept {
