@@ -26,8 +26,6 @@ using detail::DomNode;
 namespace {
 
 constexpr std::string_view kSchemaInstanceNs = "http://www.w3.org/2001/XMLSchema-instance";
-constexpr HRESULT kFileNotFound = static_cast<HRESULT>(0x80070002u);
-constexpr HRESULT kPathNotFound = static_cast<HRESULT>(0x80070003u);
 
 std::string Utf8(const _bstr_t& text) { return Utf16ToUtf8(text.View()); }
 
@@ -38,56 +36,6 @@ bool StartsWithNoCase(std::string_view text, std::string_view prefix) {
         if (c >= 'A' && c <= 'Z') c = static_cast<char>(c + 32);
         if (c != prefix[i]) return false;
     }
-    return true;
-}
-
-HRESULT CodeForErrno(int err) {
-    switch (err) {
-        case EACCES:
-        case EPERM:
-        case EROFS: return E_ACCESSDENIED;
-        case ENOENT: return kFileNotFound;
-        case ENOTDIR: return kPathNotFound;
-        default: return E_FAIL;
-    }
-}
-
-// Reads a whole file; on failure fills `error` with a reason naming the path and the cause.
-bool ReadWholeFile(const std::string& path, std::string& bytes, DomError& error) {
-    auto fail = [&](int err, const char* what) {
-        error = DomError();
-        error.code = CodeForErrno(err);
-        error.url = path;
-        error.reason = std::string(what) + " " + path + ": " + std::strerror(err);
-        return false;
-    };
-    int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
-    if (fd < 0) return fail(errno, "cannot open");
-    struct stat st {};
-    if (::fstat(fd, &st) != 0) {
-        int err = errno;
-        ::close(fd);
-        return fail(err, "cannot read");
-    }
-    if (S_ISDIR(st.st_mode)) {
-        ::close(fd);
-        return fail(EISDIR, "cannot load");
-    }
-    bytes.clear();
-    if (S_ISREG(st.st_mode) && st.st_size > 0) bytes.reserve(static_cast<std::size_t>(st.st_size));
-    char buffer[64 * 1024];
-    for (;;) {
-        ssize_t n = ::read(fd, buffer, sizeof buffer);
-        if (n == 0) break;
-        if (n < 0) {
-            if (errno == EINTR) continue;
-            int err = errno;
-            ::close(fd);
-            return fail(err, "cannot read");
-        }
-        bytes.append(buffer, static_cast<std::size_t>(n));
-    }
-    ::close(fd);
     return true;
 }
 
@@ -161,8 +109,9 @@ bool Failed(const detail::ValidationOutcome& outcome) {
 VARIANT_BOOL LoadBytes(DomDocument& doc, std::string_view bytes, const char* encoding,
                        const std::string& url) {
     DomError error;
+    detail::MemorySource source(bytes);
     detail::ParsedContent content =
-        detail::ParseXml(bytes, encoding, url, doc.EffectiveMaxDepth(), error);
+        detail::ParseXml(source, encoding, url, doc.EffectiveMaxDepth(), error);
     if (!content.store) {
         doc.Clear();
         doc.error = std::move(error);
@@ -180,6 +129,62 @@ VARIANT_BOOL LoadBytes(DomDocument& doc, std::string_view bytes, const char* enc
             }
         }
     }
+    doc.Install(std::move(content.store), content.top);
+    doc.url = url;
+    doc.error = DomError();
+    doc.error.url = url;
+    return VARIANT_TRUE;
+}
+
+VARIANT_BOOL FailLoad(DomDocument& doc, DomError error) {
+    doc.Clear();
+    doc.error = std::move(error);
+    return VARIANT_FALSE;
+}
+
+// Loads a file. The file is not held in memory while the tree is built: when the root names
+// schemas (and validate-on-parse is on) the file is read whole and validated first, then freed
+// and parsed again piece by piece, so the peak is the larger of the two phases, not their sum.
+VARIANT_BOOL LoadFile(DomDocument& doc, const std::string& path, const std::string& url) {
+    detail::FileSource source;
+    DomError error;
+    if (!source.Open(path, error)) return FailLoad(doc, std::move(error));
+    const long depth = doc.EffectiveMaxDepth();
+    if (doc.validateOnParse) {
+        detail::ParsedContent head = detail::ParseXml(source, nullptr, url, depth, error, true);
+        if (!head.store) return FailLoad(doc, std::move(error));
+        std::vector<detail::SchemaRef> refs = SchemaRefsOf(RootElement(head.top));
+        head = detail::ParsedContent();
+        if (!refs.empty()) {
+            std::string bytes;
+            std::string readError;
+            if (!source.ReadAll(bytes, readError)) {
+                error = DomError();
+                error.code = E_FAIL;
+                error.reason = readError;
+                error.url = url;
+                return FailLoad(doc, std::move(error));
+            }
+            detail::ValidationOutcome outcome =
+                detail::ValidateAgainstNamedSchemas(bytes, url, refs, doc.serverHttpRequest);
+            if (Failed(outcome)) {
+                // A document that is not even well-formed is reported as such, with the
+                // parser's own words.
+                detail::MemorySource memory(bytes);
+                detail::ParsedContent check = detail::ParseXml(memory, nullptr, url, depth, error);
+                return FailLoad(doc, check.store ? FromOutcome(outcome, url) : std::move(error));
+            }
+        }
+        if (!source.Rewind()) {
+            error = DomError();
+            error.code = detail::HResultForErrno(errno);
+            error.reason = "cannot read " + path + ": " + std::strerror(errno);
+            error.url = url;
+            return FailLoad(doc, std::move(error));
+        }
+    }
+    detail::ParsedContent content = detail::ParseXml(source, nullptr, url, depth, error);
+    if (!content.store) return FailLoad(doc, std::move(error));
     doc.Install(std::move(content.store), content.top);
     doc.url = url;
     doc.error = DomError();
@@ -259,7 +264,7 @@ DOMNodeType NodeTypeOf(const _variant_t& type) {
 // Atomically replaces `path` with `bytes`: a temporary file beside it is renamed over it.
 void WriteFileAtomically(const std::string& path, const std::string& bytes) {
     auto fail = [&](int err, const char* what) {
-        throw _com_error(CodeForErrno(err),
+        throw _com_error(detail::HResultForErrno(err),
                          std::string(what) + " " + path + ": " + std::strerror(err));
     };
     if (path.empty()) fail(ENOENT, "cannot save to");
@@ -421,17 +426,11 @@ VARIANT_BOOL IXMLDOMDocument::load(const _variant_t& source) {
             detail::HttpResult fetched = detail::HttpGet(location);
             if (!fetched.ok) return FailLoad(doc, E_FAIL, fetched.error, location);
             bytes = std::move(fetched.body);
-        } else {
-            std::string path = location;
-            if (StartsWithNoCase(path, "file://")) path.erase(0, 7);
-            DomError error;
-            if (!ReadWholeFile(path, bytes, error)) {
-                doc.Clear();
-                doc.error = std::move(error);
-                return VARIANT_FALSE;
-            }
+            return LoadBytes(doc, bytes, nullptr, location);
         }
-        return LoadBytes(doc, bytes, nullptr, location);
+        std::string path = location;
+        if (StartsWithNoCase(path, "file://")) path.erase(0, 7);
+        return LoadFile(doc, path, location);
     } catch (...) {
         return FailLoad(doc, E_OUTOFMEMORY, "out of memory while loading", "");
     }

@@ -1,8 +1,13 @@
 #include "ExpatLoader.h"
 
 #include <expat.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
+#include <cstring>
 #include <new>
 #include <vector>
 
@@ -24,7 +29,21 @@ struct Builder {
     int doctypeDepth = 0;
     bool inCdata = false;
     bool utf8Bom = false;  // the bytes start with a UTF-8 byte order mark (encoding not forced)
+    bool rootOnly = false;  // stop once the root element's start tag is built
+    bool rootSeen = false;
     std::string text;  // character data not yet turned into a node
+    // Names repeat throughout a document: a small direct-mapped cache in front of the store's
+    // table spares the key building and hashing of most lookups.
+    const DomName* nameCache[512] = {};
+
+    const DomName* Name(const XML_Char* raw) {
+        std::string_view name(raw);
+        std::uint32_t h = 2166136261u;
+        for (char c : name) h = (h ^ static_cast<unsigned char>(c)) * 16777619u;
+        const DomName*& slot = nameCache[h & 511];
+        if (!slot || slot->qname != name) slot = store->Intern(name);
+        return slot;
+    }
 
     // Why the build stopped the parser, when it did.
     std::string failure;
@@ -72,7 +91,7 @@ bool IsUtf8Label(const char* name) {
 template <class F>
 void Guard(void* data, F&& body) {
     auto* b = static_cast<Builder*>(data);
-    if (!b->failure.empty()) return;  // expat may still call a handler after a stop
+    if (!b->failure.empty() || b->rootSeen) return;  // expat may call a handler after a stop
     try {
         body(*b);
     } catch (const std::bad_alloc&) {
@@ -89,10 +108,10 @@ void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
             b.Stop("element nesting deeper than " + std::to_string(b.maxDepth));
             return;
         }
-        DomNode* element = b.store->NewNode(NODE_ELEMENT, b.store->Intern(name));
+        DomNode* element = b.store->NewNode(NODE_ELEMENT, b.Name(name));
         DomNode* lastAttribute = nullptr;
         for (const XML_Char** a = atts; *a; a += 2) {
-            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(a[0]));
+            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.Name(a[0]));
             b.store->SetText(attribute, a[1]);
             attribute->parent = element;
             attribute->prev = lastAttribute;
@@ -104,6 +123,10 @@ void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
         }
         LinkChild(b.current, element);
         b.current = element;
+        if (b.rootOnly) {
+            b.rootSeen = true;
+            XML_StopParser(b.parser, XML_FALSE);
+        }
     });
 }
 
@@ -185,15 +208,17 @@ void XMLCALL OnDoctypeStart(void* data, const XML_Char*, const XML_Char*, const 
 
 void XMLCALL OnDoctypeEnd(void* data) { static_cast<Builder*>(data)->doctypeDepth--; }
 
-// The first line of text at `offset`, for the parse error's srcText. Only for byte-oriented
-// encodings; UTF-16 input would not split on '\n' bytes.
+bool StartsWithUtf16Bom(std::string_view bytes) {
+    return bytes.size() >= 2 &&
+           ((static_cast<unsigned char>(bytes[0]) == 0xFF &&
+             static_cast<unsigned char>(bytes[1]) == 0xFE) ||
+            (static_cast<unsigned char>(bytes[0]) == 0xFE &&
+             static_cast<unsigned char>(bytes[1]) == 0xFF));
+}
+
+// The line of text around `offset`, for the parse error's srcText.
 std::string LineAt(std::string_view bytes, long offset) {
     if (offset < 0 || static_cast<std::size_t>(offset) > bytes.size()) return {};
-    if (bytes.size() >= 2 && ((static_cast<unsigned char>(bytes[0]) == 0xFF &&
-                               static_cast<unsigned char>(bytes[1]) == 0xFE) ||
-                              (static_cast<unsigned char>(bytes[0]) == 0xFE &&
-                               static_cast<unsigned char>(bytes[1]) == 0xFF)))
-        return {};
     std::size_t pos = static_cast<std::size_t>(offset);
     std::size_t begin = bytes.rfind('\n', pos == 0 ? 0 : pos - 1);
     begin = (begin == std::string_view::npos || pos == 0) ? 0 : begin + 1;
@@ -220,8 +245,101 @@ std::string DescribeLocation(const std::string& what, long line, long column,
     return s;
 }
 
-ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const std::string& url,
-                       long maxElementDepth, DomError& error) noexcept {
+MemorySource::MemorySource(std::string_view bytes) noexcept : m_bytes(bytes) {}
+
+bool MemorySource::Next(std::string_view& piece, std::string&) {
+    std::size_t n = std::min(kFeedChunk, m_bytes.size() - m_offset);
+    piece = m_bytes.substr(m_offset, n);
+    m_offset += n;
+    return true;
+}
+
+std::string MemorySource::LineAround(long offset) {
+    return StartsWithUtf16Bom(m_bytes) ? std::string() : LineAt(m_bytes, offset);
+}
+
+HRESULT HResultForErrno(int err) noexcept {
+    switch (err) {
+        case EACCES:
+        case EPERM:
+        case EROFS: return E_ACCESSDENIED;
+        case ENOENT: return static_cast<HRESULT>(0x80070002u);  // file not found
+        case ENOTDIR: return static_cast<HRESULT>(0x80070003u);  // path not found
+        default: return E_FAIL;
+    }
+}
+
+FileSource::~FileSource() {
+    if (m_fd >= 0) ::close(m_fd);
+}
+
+bool FileSource::Open(const std::string& path, DomError& error) {
+    m_path = path;
+    auto fail = [&](int err, const char* what) {
+        error = DomError();
+        error.code = HResultForErrno(err);
+        error.url = path;
+        error.reason = std::string(what) + " " + path + ": " + std::strerror(err);
+        return false;
+    };
+    m_fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (m_fd < 0) return fail(errno, "cannot open");
+    struct stat st {};
+    if (::fstat(m_fd, &st) != 0) return fail(errno, "cannot read");
+    if (S_ISDIR(st.st_mode)) return fail(EISDIR, "cannot load");
+    if (S_ISREG(st.st_mode)) m_size = static_cast<std::size_t>(st.st_size);
+    return true;
+}
+
+bool FileSource::Next(std::string_view& piece, std::string& error) {
+    m_buffer.resize(kFeedChunk);
+    for (;;) {
+        ssize_t n = ::read(m_fd, &m_buffer[0], m_buffer.size());
+        if (n < 0 && errno == EINTR) continue;
+        if (n < 0) {
+            error = "cannot read " + m_path + ": " + std::strerror(errno);
+            return false;
+        }
+        if (m_atStart && n > 0) m_utf16 = StartsWithUtf16Bom(std::string_view(m_buffer.data(), n));
+        m_atStart = false;
+        piece = std::string_view(m_buffer.data(), static_cast<std::size_t>(n));
+        return true;
+    }
+}
+
+bool FileSource::Rewind() {
+    m_atStart = true;
+    return ::lseek(m_fd, 0, SEEK_SET) == 0;
+}
+
+bool FileSource::ReadAll(std::string& bytes, std::string& error) {
+    if (!Rewind()) {
+        error = "cannot read " + m_path + ": " + std::strerror(errno);
+        return false;
+    }
+    bytes.clear();
+    bytes.reserve(m_size);
+    std::string_view piece;
+    do {
+        if (!Next(piece, error)) return false;
+        bytes.append(piece.data(), piece.size());
+    } while (!piece.empty());
+    return true;
+}
+
+std::string FileSource::LineAround(long offset) {
+    if (m_utf16 || offset < 0) return {};
+    constexpr long kWindow = 256;
+    long start = offset > kWindow ? offset - kWindow : 0;
+    std::string window(static_cast<std::size_t>(2 * kWindow), '\0');
+    ssize_t n = ::pread(m_fd, &window[0], window.size(), start);
+    if (n < 0) return {};
+    window.resize(static_cast<std::size_t>(n));
+    return LineAt(window, offset - start);
+}
+
+ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std::string& url,
+                       long maxElementDepth, DomError& error, bool rootOnly) noexcept {
     ParsedContent result;
     error = DomError();
     error.url = url;
@@ -237,7 +355,7 @@ ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const
         b.store = result.store.get();
         b.top = b.current = result.top;
         b.maxDepth = maxElementDepth;
-        b.utf8Bom = !forcedEncoding && bytes.size() >= 3 && bytes.compare(0, 3, "\xEF\xBB\xBF") == 0;
+        b.rootOnly = rootOnly;
         XML_SetUserData(parser, &b);
         XML_SetElementHandler(parser, OnStart, OnEnd);
         XML_SetCharacterDataHandler(parser, OnCharacters);
@@ -250,15 +368,30 @@ ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const
         // nothing outside the given bytes is ever read.
         XML_SetParamEntityParsing(parser, XML_PARAM_ENTITY_PARSING_NEVER);
 
-        std::size_t offset = 0;
         XML_Status status = XML_STATUS_OK;
-        do {
-            std::size_t n = std::min(kFeedChunk, bytes.size() - offset);
-            bool last = offset + n == bytes.size();
-            status = XML_Parse(parser, bytes.data() + offset, static_cast<int>(n), last);
-            offset += n;
-            if (last) break;
-        } while (status == XML_STATUS_OK);
+        bool first = true;
+        for (;;) {
+            std::string_view piece;
+            std::string readError;
+            if (!source.Next(piece, readError)) {
+                XML_ParserFree(parser);
+                error.code = E_FAIL;
+                error.reason = readError;
+                return ParsedContent();
+            }
+            if (first) {
+                b.utf8Bom = !forcedEncoding && piece.size() >= 3 &&
+                            piece.compare(0, 3, "\xEF\xBB\xBF") == 0;
+                first = false;
+            }
+            bool last = piece.empty();
+            status = XML_Parse(parser, piece.data(), static_cast<int>(piece.size()), last);
+            if (status != XML_STATUS_OK || last) break;
+        }
+        if (b.rootSeen) {
+            XML_ParserFree(parser);
+            return result;
+        }
 
         if (status != XML_STATUS_OK || !b.failure.empty()) {
             error.code = XML_E_PARSEFAILED;
@@ -276,7 +409,7 @@ ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const
                 error.filepos = static_cast<long>(XML_GetCurrentByteIndex(parser));
             }
             error.reason = DescribeLocation(what, error.line, error.linepos, url);
-            error.srcText = LineAt(bytes, error.filepos);
+            error.srcText = source.LineAround(error.filepos);
             XML_ParserFree(parser);
             return ParsedContent();
         }

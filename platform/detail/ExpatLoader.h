@@ -17,11 +17,60 @@ struct ParsedContent {
     DomNode* top = nullptr;
 };
 
-/// Parses `bytes`. `forcedEncoding` (e.g. "UTF-8") overrides BOM and declaration detection;
+/// Bytes to parse, delivered in pieces so that a file need not be held in memory whole.
+class XmlSource {
+public:
+    virtual ~XmlSource() = default;
+    /// The next piece (empty at the end); false with `error` set when reading fails.
+    virtual bool Next(std::string_view& piece, std::string& error) = 0;
+    /// The line of text around byte `offset`, for error reports; empty when unknown.
+    virtual std::string LineAround(long offset) = 0;
+};
+
+class MemorySource final : public XmlSource {
+public:
+    explicit MemorySource(std::string_view bytes) noexcept;
+    bool Next(std::string_view& piece, std::string& error) override;
+    std::string LineAround(long offset) override;
+
+private:
+    std::string_view m_bytes;
+    std::size_t m_offset = 0;
+};
+
+class FileSource final : public XmlSource {
+public:
+    FileSource() = default;
+    ~FileSource() override;
+    FileSource(const FileSource&) = delete;
+    FileSource& operator=(const FileSource&) = delete;
+    /// Opens a file for reading; false with a reason naming the path and the cause.
+    bool Open(const std::string& path, DomError& error);
+    bool Next(std::string_view& piece, std::string& error) override;
+    std::string LineAround(long offset) override;
+    /// Starts reading again from the first byte.
+    bool Rewind();
+    /// Reads the whole file from its start.
+    bool ReadAll(std::string& bytes, std::string& error);
+
+private:
+    int m_fd = -1;
+    std::string m_path;
+    std::string m_buffer;
+    std::size_t m_size = 0;
+    bool m_atStart = true;
+    bool m_utf16 = false;
+};
+
+/// The failure code for an errno value (E_ACCESSDENIED, file/path not found, E_FAIL).
+HRESULT HResultForErrno(int err) noexcept;
+
+/// Parses the source. `forcedEncoding` (e.g. "UTF-8") overrides BOM and declaration detection;
 /// null lets expat detect the encoding. `url` names the source in error reasons (may be empty).
-/// Returns the content, or an empty store with `error` filled. Never throws.
-ParsedContent ParseXml(std::string_view bytes, const char* forcedEncoding, const std::string& url,
-                       long maxElementDepth, DomError& error) noexcept;
+/// With `rootOnly` parsing stops after the root element's start tag (for a look at its
+/// attributes). Returns the content, or an empty store with `error` filled. Never throws.
+ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std::string& url,
+                       long maxElementDepth, DomError& error, bool rootOnly = false) noexcept;
 
 /// "<what> at line L, column C in URL" (the " in URL" part when url is not empty).
 std::string DescribeLocation(const std::string& what, long line, long column,

@@ -348,13 +348,17 @@ TEST(DomLoad, ValidateOnParseChecksTheSchemasTheRootNames) {
         std::string xml;
         bool validate;
         bool loads;
+        const char* reason = "";  // expected start of the reason
     };
+    std::string broken = doc("xsi", "12");
+    broken.insert(broken.size() - 4, "</n>");
     const Row rows[] = {
         {"valid", doc("xsi", "12"), true, true},
         {"invalid", doc("xsi", "twelve"), true, false},
         {"invalid, other prefix", doc("i", "twelve"), true, false},
         {"invalid, validation off", doc("xsi", "twelve"), false, true},
         {"no schema named", "<r><n>twelve</n></r>", true, true},
+        {"not well-formed, schema named", broken, true, false, "mismatched tag at line 1"},
     };
     TempDir dir;
     for (const Row& row : rows) {
@@ -368,6 +372,7 @@ TEST(DomLoad, ValidateOnParseChecksTheSchemasTheRootNames) {
         if (!row.loads) {
             EXPECT_NE(d->GetparseError()->GeterrorCode(), 0);
             EXPECT_NE(ReasonOf(d), "");
+            EXPECT_EQ(ReasonOf(d).rfind(row.reason, 0), 0u) << ReasonOf(d);
             EXPECT_FALSE(d->GetdocumentElement());
         }
     }
