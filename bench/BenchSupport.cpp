@@ -33,54 +33,42 @@ void XMLCALL OnCharacters(void* data, const XML_Char*, int length) {
 
 ExpatPassResult ExpatPass(const std::string& path) {
     ExpatPassResult result;
-    // The file is read as the DOM reads it: read() in 64 KiB pieces appended to a buffer
-    // reserved at the file's size; expat is then fed in 256 KiB slices.
+    // The file is read as the DOM reads it: read() in 256 KiB pieces into one reused buffer,
+    // each piece handed to expat at once, and an empty last piece to end the document.
     const int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
     if (fd < 0) {
         result.error = "cannot open " + path;
         return result;
     }
-    std::string bytes;
-    struct stat st {};
-    if (::fstat(fd, &st) == 0 && st.st_size > 0) bytes.reserve(static_cast<std::size_t>(st.st_size));
-    char buffer[64 * 1024];
-    for (;;) {
-        const ssize_t n = ::read(fd, buffer, sizeof buffer);
-        if (n == 0) break;
-        if (n < 0) {
-            if (errno == EINTR) continue;
-            ::close(fd);
-            result.error = "cannot read " + path;
-            return result;
-        }
-        bytes.append(buffer, static_cast<std::size_t>(n));
-    }
-    ::close(fd);
-
     XML_Parser parser = XML_ParserCreate(nullptr);
     if (!parser) {
+        ::close(fd);
         result.error = "XML_ParserCreate failed";
         return result;
     }
     XML_SetUserData(parser, &result);
     XML_SetElementHandler(parser, OnStart, OnEnd);
     XML_SetCharacterDataHandler(parser, OnCharacters);
-    const std::size_t kSlice = 256 * 1024;
-    std::size_t offset = 0;
+    std::string buffer(256 * 1024, '\0');
     bool ok = true;
-    do {
-        const std::size_t n = std::min(kSlice, bytes.size() - offset);
-        const bool last = offset + n == bytes.size();
-        if (XML_Parse(parser, bytes.data() + offset, static_cast<int>(n), last) !=
-            XML_STATUS_OK) {
+    for (;;) {
+        const ssize_t n = ::read(fd, &buffer[0], buffer.size());
+        if (n < 0 && errno == EINTR) continue;
+        if (n < 0) {
+            ok = false;
+            result.error = "cannot read " + path;
+            break;
+        }
+        const bool last = n == 0;
+        if (XML_Parse(parser, buffer.data(), static_cast<int>(n), last) != XML_STATUS_OK) {
             ok = false;
             result.error = XML_ErrorString(XML_GetErrorCode(parser));
             break;
         }
-        offset += n;
         if (last) break;
-    } while (true);
+    }
     XML_ParserFree(parser);
+    ::close(fd);
     result.ok = ok;
     return result;
 }
