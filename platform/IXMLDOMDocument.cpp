@@ -261,8 +261,9 @@ DOMNodeType NodeTypeOf(const _variant_t& type) {
     return static_cast<DOMNodeType>(static_cast<long>(type));
 }
 
-// Atomically replaces `path` with `bytes`: a temporary file beside it is renamed over it.
-void WriteFileAtomically(const std::string& path, const std::string& bytes) {
+// Atomically replaces `path` with the document's text: a temporary file beside it is written
+// piece by piece and renamed over it; on any failure the temporary file is removed.
+void SaveAtomically(const DomNode* document, const std::string& path) {
     auto fail = [&](int err, const char* what) {
         throw _com_error(detail::HResultForErrno(err),
                          std::string(what) + " " + path + ": " + std::strerror(err));
@@ -273,49 +274,51 @@ void WriteFileAtomically(const std::string& path, const std::string& bytes) {
     std::string base = slash == std::string::npos ? path : path.substr(slash + 1);
     if (base.empty()) fail(EISDIR, "cannot save to");
     struct stat st {};
-    if (::stat(path.c_str(), &st) == 0 && S_ISDIR(st.st_mode)) fail(EISDIR, "cannot save to");
     mode_t mode = 0666;
-    bool exists = ::stat(path.c_str(), &st) == 0;
-    if (exists) {
-        mode = st.st_mode & 07777;
+    if (::stat(path.c_str(), &st) == 0) {
+        if (S_ISDIR(st.st_mode)) fail(EISDIR, "cannot save to");
+        mode = st.st_mode & 07777;  // a replaced file keeps its permissions
     } else {
         // New files get the usual permissions, as open() would give them.
         std::ifstream status("/proc/self/status");
         std::string line;
         mode_t mask = 022;
         while (std::getline(status, line))
-            if (line.compare(0, 6, "Umask:") == 0) mask = static_cast<mode_t>(std::strtol(line.c_str() + 6, nullptr, 8));
+            if (line.compare(0, 6, "Umask:") == 0)
+                mask = static_cast<mode_t>(std::strtol(line.c_str() + 6, nullptr, 8));
         mode &= ~mask;
     }
     std::string temp = dir + "/." + base + ".XXXXXX";
     int fd = ::mkstemp(&temp[0]);
     if (fd < 0) fail(errno, "cannot save to");
-    auto failAfterTemp = [&](int err, const char* what) {
-        ::close(fd);
-        ::unlink(temp.c_str());
-        fail(err, what);
-    };
-    std::size_t done = 0;
-    while (done < bytes.size()) {
-        ssize_t n = ::write(fd, bytes.data() + done, bytes.size() - done);
-        if (n < 0) {
-            if (errno == EINTR) continue;
-            failAfterTemp(errno, "cannot write");
+    struct TempFile {
+        int fd;
+        const std::string& path;
+        bool keep = false;
+        ~TempFile() {
+            if (fd >= 0) ::close(fd);
+            if (!keep) ::unlink(path.c_str());
         }
-        done += static_cast<std::size_t>(n);
-    }
-    if (::fchmod(fd, mode) != 0) failAfterTemp(errno, "cannot save to");
-    if (::fsync(fd) != 0) failAfterTemp(errno, "cannot write");
-    if (::close(fd) != 0) {
-        int err = errno;
-        ::unlink(temp.c_str());
-        fail(err, "cannot write");
-    }
-    if (::rename(temp.c_str(), path.c_str()) != 0) {
-        int err = errno;
-        ::unlink(temp.c_str());
-        fail(err, "cannot save to");
-    }
+    } guard{fd, temp};
+    auto write = [&](std::string_view piece) {
+        while (!piece.empty()) {
+            ssize_t n = ::write(fd, piece.data(), piece.size());
+            if (n < 0) {
+                if (errno == EINTR) continue;
+                fail(errno, "cannot write");
+            }
+            piece.remove_prefix(static_cast<std::size_t>(n));
+        }
+    };
+    std::string buffer;
+    buffer.reserve(1024 * 1024 + 64 * 1024);
+    detail::WriteXml(document, buffer, write);
+    if (::fchmod(fd, mode) != 0) fail(errno, "cannot save to");
+    if (::fsync(fd) != 0) fail(errno, "cannot write");
+    guard.fd = -1;
+    if (::close(fd) != 0) fail(errno, "cannot write");
+    if (::rename(temp.c_str(), path.c_str()) != 0) fail(errno, "cannot save to");
+    guard.keep = true;
 }
 
 }  // namespace
@@ -460,10 +463,7 @@ VARIANT_BOOL IXMLDOMDocument::loadBuffer(const void* data, std::size_t size) {
 void IXMLDOMDocument::save(const _variant_t& destination) {
     if (destination.vt != VT_BSTR)
         throw _com_error(E_INVALIDARG, "save takes a file path as a string");
-    std::string path = Utf16ToUtf8(BstrView(destination.bstrVal));
-    std::string out;
-    detail::WriteXml(&m_doc->node, out);
-    WriteFileAtomically(path, out);
+    SaveAtomically(&m_doc->node, Utf16ToUtf8(BstrView(destination.bstrVal)));
 }
 
 IXMLDOMParseErrorPtr IXMLDOMDocument::GetparseError() const {

@@ -187,7 +187,9 @@ void AppendLeaf(std::string& out, const DomNode* node) {
     }
 }
 
-void AppendSubtree(std::string& out, const DomNode* root) {
+constexpr std::size_t kFlushSize = 1024 * 1024;
+
+void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush) {
     Scope scope;
     std::vector<std::size_t> marks;
     const DomNode* node = root;
@@ -215,19 +217,27 @@ void AppendSubtree(std::string& out, const DomNode* root) {
         }
         if (node == root) return;
         node = node->next;
+        if (flush && out.size() >= kFlushSize) {
+            flush(out);
+            out.clear();
+        }
     }
 }
 
 }  // namespace
 
-void WriteXml(const DomNode* node, std::string& out) {
+void WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
     if (node->type != NODE_DOCUMENT) {
-        AppendSubtree(out, node);
-        return;
+        AppendSubtree(out, node, flush);
+    } else {
+        for (const DomNode* child = node->firstChild; child; child = child->next) {
+            AppendSubtree(out, child, flush);
+            out += '\n';
+        }
     }
-    for (const DomNode* child = node->firstChild; child; child = child->next) {
-        AppendSubtree(out, child);
-        out += '\n';
+    if (flush && !out.empty()) {
+        flush(out);
+        out.clear();
     }
 }
 

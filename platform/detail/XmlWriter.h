@@ -12,15 +12,22 @@
 // encoding always "UTF-8" (the bytes written are UTF-8); a document without one gets none.
 // No whitespace is added except a line break after each node at document level.
 
+#include <functional>
 #include <string>
+#include <string_view>
 
 #include "DomDocument.h"
 
 namespace kest {
 namespace detail {
 
+/// Receives written text in pieces; may throw to stop the writing.
+using XmlFlush = std::function<void(std::string_view)>;
+
 /// Appends the XML text of `node` (its subtree included) to `out`. Iterative: any depth works.
-void WriteXml(const DomNode* node, std::string& out);
+/// With `flush`, the text is handed over in pieces of about a megabyte as it grows (and `out`
+/// is left empty), so that large documents need no second copy of themselves in memory.
+void WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush = nullptr);
 
 }  // namespace detail
 }  // namespace kest

@@ -377,3 +377,35 @@ TEST(DomLoad, ValidateOnParseChecksTheSchemasTheRootNames) {
         }
     }
 }
+
+TEST(DomLoad, ValidateUsesAttachedSchemasOrThoseTheRootNames) {
+    const std::string schema = std::string(KEST_TEST_DATA_DIR) + "/dom/small.xsd";
+    IXMLDOMSchemaCollectionPtr cache;
+    ASSERT_EQ(cache.CreateInstance(kProgIdXMLSchemaCache40), S_OK);
+    cache->add(u"urn:kest:dom-test", _variant_t(schema));
+
+    IXMLDOMDocument2Ptr doc = Parsed("<r xmlns=\"urn:kest:dom-test\"><n>1</n></r>");
+    IXMLDOMParseErrorPtr result = doc->validate();
+    EXPECT_NE(result->GeterrorCode(), 0) << "no schema attached or named";
+    doc->putref_schemas(cache);
+    EXPECT_TRUE(doc->Getschemas() == cache);
+    result = doc->validate();
+    EXPECT_EQ(result->GeterrorCode(), 0) << result->Getreason().ToString();
+    EXPECT_EQ(result->Getreason().length(), 0u);
+
+    // A value changed through the DOM is what gets validated.
+    IXMLDOMNodePtr text = doc->GetdocumentElement()->GetfirstChild()->GetfirstChild();
+    text->PutnodeValue(_variant_t("one"));
+    result = doc->validate();
+    EXPECT_NE(result->GeterrorCode(), 0);
+    EXPECT_NE(result->Getreason().length(), 0u);
+    EXPECT_EQ(doc->GetparseError()->GeterrorCode(), result->GeterrorCode());
+
+    // Without a collection the schemas the root names are used.
+    IXMLDOMDocument2Ptr named = Parsed(
+        "<r xmlns=\"urn:kest:dom-test\" xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\" "
+        "xsi:schemaLocation=\"urn:kest:dom-test " + schema + "\"><n>x</n></r>");
+    EXPECT_NE(named->validate()->GeterrorCode(), 0);
+    named->GetdocumentElement()->GetlastChild()->GetfirstChild()->PutnodeValue(_variant_t("3"));
+    EXPECT_EQ(named->validate()->GeterrorCode(), 0);
+}
