@@ -119,7 +119,8 @@ void KestCdfAxis::PutStringsIntoSafeArray(const _variant_t& value, _variant_t& a
 }
 
 _variant_t KestCdfAxis::GetNumbersFromSafeArray(const _variant_t& value) const {
-    return detail::FormatValueList(value, detail::ElementWriting::kAxis);
+    return detail::FormatValueList(value, detail::ElementWriting::kAxis,
+                                   detail::IsFormatType(m_formatType, detail::kFormatString));
 }
 
 bool KestCdfAxis::ConvertAxisNode(IXMLDOMNodePtr node) {

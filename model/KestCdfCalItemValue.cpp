@@ -92,7 +92,8 @@ void KestCdfCalItemValue::PutStringsIntoSafeArray(const _variant_t& value,
 }
 
 _variant_t KestCdfCalItemValue::GetNumbersFromSafeArray(const _variant_t& value) const {
-    return detail::FormatValueList(value, detail::ElementWriting::kCalItemValue);
+    return detail::FormatValueList(value, detail::ElementWriting::kCalItemValue,
+                                   detail::IsFormatType(m_formatType, detail::kFormatString));
 }
 
 bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {

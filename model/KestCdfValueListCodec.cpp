@@ -101,11 +101,19 @@ void AppendPlatformText(std::u16string& out, const VARIANT& value) {
     VariantClear(&text);
 }
 
-void AppendElement(std::u16string& out, const VARIANT& element, ElementWriting writing) {
+void AppendElement(std::u16string& out, const VARIANT& element, ElementWriting writing,
+                   bool quoteStrings) {
     switch (element.vt) {
-    case VT_BSTR:
-        out.append(BstrView(element.bstrVal));
+    case VT_BSTR: {
+        const std::u16string_view text = BstrView(element.bstrVal);
+        // A string that holds a quote cannot be quoted faithfully (there is no escape); it is
+        // written as it stands, which also keeps a host's pre-quoted text unchanged.
+        const bool quote = quoteStrings && text.find(u'"') == std::u16string_view::npos;
+        if (quote) out.push_back(u'"');
+        out.append(text);
+        if (quote) out.push_back(u'"');
         return;
+    }
     case VT_R8:
         // "%.15g" never writes a ',' in the C locale, so no separator needs replacing.
         AppendDouble(out, element.dblVal);
@@ -269,7 +277,7 @@ void PutQuotedStrings(std::u16string_view text, VARIANT& array) {
     }
 }
 
-_variant_t FormatValueList(const VARIANT& stored, ElementWriting writing) {
+_variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings) {
     // One growing buffer per thread, so that writing many values does not allocate per value.
     thread_local std::u16string out;
     out.clear();
@@ -282,7 +290,7 @@ _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing) {
         for (long long i = 0; i < n; ++i) {
             // Index i is fetched as an element index; one outside the bounds adds nothing.
             if (i < lowerBound || i - lowerBound >= n) continue;
-            AppendElement(out, data.get()[i - lowerBound], writing);
+            AppendElement(out, data.get()[i - lowerBound], writing, quoteStrings);
             if (i < n - 1) out.push_back(u' ');
         }
     }

@@ -84,7 +84,12 @@ void PutQuotedStrings(std::u16string_view text, VARIANT& array);
 /// The value text of a stored value: the elements in index order separated by one space; the
 /// empty text for a value that is not VT_ARRAY|VT_VARIANT. An index the array cannot deliver
 /// adds neither text nor separator.
-_variant_t FormatValueList(const VARIANT& stored, ElementWriting writing);
+///
+/// With `quoteStrings` (format type "STRING") a string element without any double quote in it
+/// is written between double quotes: the reader takes strings only from between quotes, so
+/// unquoted strings would not survive being read back. A string holding a quote is written as
+/// it stands.
+_variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings);
 
 /// atoi in the C locale over [first, last): white space skipped, optional sign, decimal
 /// digits, stopping at the first other character; 0 when there is no number. Values outside

@@ -319,21 +319,21 @@ TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
     data[6].vt = VT_BOOL, data[6].boolVal = VARIANT_TRUE;
     ASSERT_EQ(S_OK, SafeArrayUnaccessData(array.parray));
 
-    _variant_t axis = FormatValueList(array, ElementWriting::kAxis);
+    _variant_t axis = FormatValueList(array, ElementWriting::kAxis, false);
     ASSERT_EQ(VT_BSTR, axis.vt);
     EXPECT_EQ(u"1e+020 0.100000001490116 -42 a b 0 7 -1",
               std::u16string(BstrView(axis.bstrVal)));
-    _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue);
+    _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue, false);
     EXPECT_EQ(u"1e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
 }
 
 TEST(KestCdfValueListCodec, WritesTheEmptyTextForNoArray) {
     for (const _variant_t& value : {_variant_t(), _variant_t(2.5), _variant_t(u"x")}) {
-        _variant_t text = FormatValueList(value, ElementWriting::kAxis);
+        _variant_t text = FormatValueList(value, ElementWriting::kAxis, false);
         ASSERT_EQ(VT_BSTR, text.vt);
         EXPECT_EQ(0u, SysStringLen(text.bstrVal));
     }
-    _variant_t empty = FormatValueList(NewValueArray(0), ElementWriting::kCalItemValue);
+    _variant_t empty = FormatValueList(NewValueArray(0), ElementWriting::kCalItemValue, false);
     EXPECT_EQ(0u, SysStringLen(empty.bstrVal));
 }
 
@@ -348,7 +348,7 @@ TEST(KestCdfValueListCodec, IndexesTheArrayCannotDeliverAddNothing) {
         _variant_t element(static_cast<int>(i * 10));
         ASSERT_EQ(S_OK, SafeArrayPutElement(array.parray, &i, &element));
     }
-    _variant_t text = FormatValueList(array, ElementWriting::kAxis);
+    _variant_t text = FormatValueList(array, ElementWriting::kAxis, false);
     EXPECT_EQ(u"10 20", std::u16string(BstrView(text.bstrVal)));
 }
 
@@ -365,7 +365,7 @@ TEST(KestCdfValueListCodec, IgnoresTheProcessLocale) {
     EXPECT_EQ("1.5e+020", Format(1.5e20));
     _variant_t array = NewValueArray(2);
     FillNumbers(u"0.25 1e-5", NumberTyping::kPerToken, array);
-    _variant_t text = FormatValueList(array, ElementWriting::kCalItemValue);
+    _variant_t text = FormatValueList(array, ElementWriting::kCalItemValue, false);
     std::setlocale(LC_ALL, previous.c_str());
     EXPECT_EQ(u"0.25 1", std::u16string(BstrView(text.bstrVal)));
 }
