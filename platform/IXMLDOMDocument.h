@@ -5,7 +5,9 @@
 // fetched, entity expansion is bounded by expat, and element nesting deeper than
 // kDefaultMaxElementDepth (or the "MaxElementDepth" property) fails the load. Text is kept as
 // the parser delivers it: adjacent character data becomes one text node, whitespace-only text
-// between elements included.
+// between elements included. The XML declaration becomes a processing instruction "xml" whose
+// pseudo-attributes (version, encoding, standalone) are its attributes. A failed load leaves the
+// document empty; nodes of earlier content that are still referenced stay readable, detached.
 
 #include <cstddef>
 
@@ -49,7 +51,8 @@ public:
     VARIANT_BOOL loadBuffer(const void* data, std::size_t size);
     /// Writes the document as UTF-8 to a file path, atomically: a temporary file in the target
     /// directory is renamed on success. On failure throws _com_error and leaves any earlier
-    /// file untouched.
+    /// file untouched. The declaration is written from the document's "xml" processing
+    /// instruction, its encoding always "UTF-8"; a document without one is written without.
     void save(const _variant_t& destination);
     /// The result of the last load or validation.
     IXMLDOMParseErrorPtr GetparseError() const;
@@ -63,7 +66,8 @@ public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_DOCUMENT);
     }
-    /// Used by DomPtr::CreateInstance.
+    /// Used by DomPtr::CreateInstance. Names are compared case-insensitively; another ProgID or
+    /// class id gives REGDB_E_CLASSNOTREG, text that is neither gives CO_E_CLASSSTRING.
     static HRESULT CreateDocument(const OLECHAR* progId, detail::DomDocument** document,
                                   detail::DomNode** node) noexcept;
 };
