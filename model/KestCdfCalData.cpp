@@ -1,48 +1,15 @@
 #include "KestCdfCalData.h"
 
+#include "KestCdfDomWriting.h"
+
 #include "../core/KestCalmorphDLLError.h"
 
 namespace kest {
-namespace {
 
-IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
-                             const OLECHAR* name, const _bstr_t& ns) {
-    IXMLDOMNodePtr element =
-        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(name), ns);
-    parent->appendChild(element);
-    return element;
-}
-
-// One element holding one text node; a null text gives empty content.
-void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
-                       const _bstr_t& ns, BSTR text) {
-    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
-    IXMLDOMNodePtr node =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
-    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
-    element->appendChild(node);
-}
-
-// The text of a text-only element: the last child node's value, empty (not null) without
-// children. A child without text (a nested element) throws _com_error.
-CComBSTR ElementText(const IXMLDOMNodePtr& element) {
-    CComBSTR text(std::u16string_view{});
-    IXMLDOMNodeListPtr parts = element->GetchildNodes();
-    if (!parts) return text;
-    while (IXMLDOMNodePtr part = parts->nextNode()) {
-        text = CComBSTR(_bstr_t(part->GetnodeValue()).View());
-    }
-    return text;
-}
-
-void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const OLECHAR* name, BSTR value) {
-    IXMLDOMAttributePtr attribute = doc->createAttribute(_bstr_t(name));
-    attribute->PutnodeValue(_variant_t(_bstr_t(BstrView(value))));
-    attributes->setNamedItem(attribute);
-}
-
-}  // namespace
+using detail::AppendElement;
+using detail::AppendTextElement;
+using detail::ElementText;
+using detail::AddAttribute;
 
 KestCdfCalList* KestCdfCalData::CreateCalList(int count) {
     m_calLists.AllocateArray(count);

@@ -1,34 +1,14 @@
 #include "KestCdfCalItem.h"
 
+#include "KestCdfDomWriting.h"
+
 #include "../core/KestCalmorphDLLError.h"
 
 namespace kest {
-namespace {
 
-IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
-                             const OLECHAR* name, const _bstr_t& ns) {
-    IXMLDOMNodePtr element =
-        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(name), ns);
-    parent->appendChild(element);
-    return element;
-}
-
-// One element holding one text node; a null text gives empty content.
-void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
-                       const _bstr_t& ns, BSTR text) {
-    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
-    IXMLDOMNodePtr node =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
-    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
-    element->appendChild(node);
-}
-
-// A node's value as owned text; an element's (null) value throws _com_error.
-CComBSTR TextOf(const IXMLDOMNodePtr& node) {
-    return CComBSTR(_bstr_t(node->GetnodeValue()).View());
-}
-
-}  // namespace
+using detail::AppendElement;
+using detail::AppendTextElement;
+using detail::TextOf;
 
 KestCdfCalItemValue KestCdfCalItem::GetCalItemValue() const {
     if (!m_value.get()) throw _com_error(E_POINTER);

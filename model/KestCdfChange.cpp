@@ -1,6 +1,12 @@
 #include "KestCdfChange.h"
 
+#include "KestCdfDomWriting.h"
+
 namespace kest {
+
+using detail::AppendElement;
+using detail::AppendTextElement;
+
 namespace {
 
 // Text elements of CHANGE.
@@ -9,24 +15,6 @@ constexpr const OLECHAR* kDate = u"DATE";
 constexpr const OLECHAR* kTool = u"TOOL";
 constexpr const OLECHAR* kNote = u"NOTE";
 constexpr const OLECHAR* kDataVersion = u"DATA-VERSION";
-
-IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
-                             const OLECHAR* name, const _bstr_t& ns) {
-    IXMLDOMNodePtr element =
-        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(name), ns);
-    parent->appendChild(element);
-    return element;
-}
-
-// One element holding one text node; a null text gives empty content.
-void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
-                       const _bstr_t& ns, BSTR text) {
-    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
-    IXMLDOMNodePtr node =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
-    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
-    element->appendChild(node);
-}
 
 // The text of every child node of `element` in turn; the last one stands. Computed aside so
 // that a child without text (a nested element) leaves the field as it was.

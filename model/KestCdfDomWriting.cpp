@@ -1,0 +1,45 @@
+#include "KestCdfDomWriting.h"
+
+namespace kest {
+namespace detail {
+
+IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                             const OLECHAR* name, const _bstr_t& ns) {
+    IXMLDOMNodePtr element =
+        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(name), ns);
+    parent->appendChild(element);
+    return element;
+}
+
+void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                       const _bstr_t& ns, BSTR text) {
+    IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
+    IXMLDOMNodePtr node =
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+    node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
+    element->appendChild(node);
+}
+
+CComBSTR TextOf(const IXMLDOMNodePtr& node) {
+    return CComBSTR(_bstr_t(node->GetnodeValue()).View());
+}
+
+CComBSTR ElementText(const IXMLDOMNodePtr& element) {
+    CComBSTR text(std::u16string_view{});
+    IXMLDOMNodeListPtr parts = element->GetchildNodes();
+    if (!parts) return text;
+    while (IXMLDOMNodePtr part = parts->nextNode()) {
+        text = CComBSTR(_bstr_t(part->GetnodeValue()).View());
+    }
+    return text;
+}
+
+void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
+                  const OLECHAR* name, BSTR value) {
+    IXMLDOMAttributePtr attribute = doc->createAttribute(_bstr_t(name));
+    attribute->PutnodeValue(_variant_t(_bstr_t(BstrView(value))));
+    attributes->setNamedItem(attribute);
+}
+
+}  // namespace detail
+}  // namespace kest

@@ -1,0 +1,31 @@
+#pragma once
+// Small DOM steps shared by the element readers and writers of the document model.
+
+#include "../platform/Automation.h"
+#include "../platform/XmlDom.h"
+
+namespace kest {
+namespace detail {
+
+/// Creates the element `name` in namespace `ns` and appends it to `parent` (which is checked
+/// only once the element exists, so an empty parent fails with E_POINTER after creation).
+IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                             const OLECHAR* name, const _bstr_t& ns);
+
+/// Appends the element `name` holding one text node; a null text gives empty content.
+void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                       const _bstr_t& ns, BSTR text);
+
+/// A node's value as owned text; an element's (null) value throws _com_error.
+CComBSTR TextOf(const IXMLDOMNodePtr& node);
+
+/// The text of a text-only element: the last child node's value, empty (not null) without
+/// children. A child without text (a nested element) throws _com_error.
+CComBSTR ElementText(const IXMLDOMNodePtr& element);
+
+/// Creates the attribute `name` with `value` (null gives empty text) and adds it to the map.
+void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
+                  const OLECHAR* name, BSTR value);
+
+}  // namespace detail
+}  // namespace kest
