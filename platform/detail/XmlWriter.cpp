@@ -90,7 +90,7 @@ bool IsUtf8Name(std::string_view encoding) {
 void AppendPI(std::string& out, const DomNode* node) {
     out += "<?";
     out += node->Name();
-    if (node->IsDeclaration() && node->firstAttribute) {
+    if (node->IsDeclaration()) {
         const DomNode* version = FindAttribute(node, "version");
         AppendAttribute(out, "version", version ? version->Text() : "1.0");
         for (const DomNode* a = node->firstAttribute; a; a = a->next) {
