@@ -6,12 +6,14 @@
 //                                first and is not counted: its peak is reset before the write)
 //
 // The peak is getrusage(RUSAGE_SELF).ru_maxrss after the operation minus the resident size
-// just before it. Run one mode per process: the peak of a process only grows, except where
-// the kernel lets it be reset (/proc/self/clear_refs), which the write mode needs.
+// just before it, taken after freed heap memory has been handed back (malloc_trim). Run one
+// mode per process: the peak of a process only grows, except where the kernel lets it be
+// reset (/proc/self/clear_refs), which the write mode needs.
 //
 // Output, one line: mode=... file_bytes=... baseline_kb=... peak_kb=... extra_kb=...
 //                   ratio=...  (ratio = extra / file size)
 
+#include <malloc.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
@@ -44,6 +46,13 @@ long MaxRssKb() {
     rusage usage {};
     getrusage(RUSAGE_SELF, &usage);
     return usage.ru_maxrss;  // kilobytes on Linux
+}
+
+// Hands freed heap memory back to the system, so that the resident size before an operation
+// holds only what is in use; otherwise an operation could reuse pages that an earlier step
+// freed and its growth would not show.
+void ReleaseFreeMemory() {
+    malloc_trim(0);
 }
 
 // Resets the peak to the present resident size; false where the kernel does not allow it.
@@ -86,6 +95,7 @@ int main(int argc, char** argv) {
         bool resetOk = true;
         if (mode == "dom-load") {
             IXMLDOMDocument2Ptr doc;
+            ReleaseFreeMemory();
             baseline = ResidentKb();
             if (FAILED(doc.CreateInstance(kProgIdDOMDocument40))) throw std::runtime_error("no DOM");
             doc->Putasync(VARIANT_FALSE);
@@ -96,6 +106,7 @@ int main(int argc, char** argv) {
         } else if (mode == "read") {
             KestCalmorph converter;
             CComBSTR message;
+            ReleaseFreeMemory();
             baseline = ResidentKb();
             KestCdfCalData data = converter.ConvertXMLtoCPP(CComBSTR(file), true, message);
             peak = MaxRssKb();
@@ -107,6 +118,7 @@ int main(int argc, char** argv) {
             KestCdfCalData data = reader.ConvertXMLtoCPP(CComBSTR(file), true, message);
             if (message.Length()) throw std::runtime_error("read: " + message.ToString());
             KestCalmorph writer;
+            ReleaseFreeMemory();
             resetOk = ResetPeak();
             baseline = ResidentKb();
             if (!writer.ConvertCPPToXML(data, CComBSTR(std::string(argv[3])), CComBSTR(u"")))
