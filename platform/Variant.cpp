@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <cstring>
 #include <limits>
+#include <new>
 #include <string>
 #include <system_error>
 #include <type_traits>
@@ -116,7 +117,7 @@ std::u16string_view TrimBlanks(std::u16string_view text) noexcept {
 // Parses a decimal number: optional sign, digits with an optional fraction (at least one digit
 // in all), optional exponent; blanks around it are allowed. The grammar is checked here so
 // that std::from_chars never sees the forms it would accept beyond it (inf, nan, hex).
-HRESULT ParseNumber(std::u16string_view text, double* number) noexcept {
+HRESULT ParseNumber(std::u16string_view text, double* number) {
     text = TrimBlanks(text);
     if (text.empty()) return DISP_E_TYPEMISMATCH;
     std::string ascii;
@@ -204,7 +205,12 @@ HRESULT FromText(BSTR text, VARTYPE vt, VARIANT* result) noexcept {
         if (EqualsIgnoringAsciiCase(word, u"false")) return FromDouble(0.0, VT_BOOL, result);
     }
     double number = 0.0;
-    HRESULT hr = ParseNumber(view, &number);
+    HRESULT hr;
+    try {
+        hr = ParseNumber(view, &number);
+    } catch (const std::bad_alloc&) {
+        return E_OUTOFMEMORY;  // the narrow copy of a very long text
+    }
     if (FAILED(hr)) return hr;
     return FromDouble(number, vt, result);
 }
