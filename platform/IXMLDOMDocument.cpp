@@ -269,13 +269,24 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
                          std::string(what) + " " + path + ": " + std::strerror(err));
     };
     if (path.empty()) fail(ENOENT, "cannot save to");
-    std::string::size_type slash = path.rfind('/');
-    std::string dir = slash == std::string::npos ? "." : (slash == 0 ? "/" : path.substr(0, slash));
-    std::string base = slash == std::string::npos ? path : path.substr(slash + 1);
+    // Saving through a symbolic link replaces the file it points to, not the link.
+    std::string target = path;
+    struct stat link {};
+    if (::lstat(path.c_str(), &link) == 0 && S_ISLNK(link.st_mode)) {
+        char* resolved = ::realpath(path.c_str(), nullptr);
+        if (resolved) {
+            target = resolved;
+            std::free(resolved);
+        }
+    }
+    std::string::size_type slash = target.rfind('/');
+    std::string dir =
+        slash == std::string::npos ? "." : (slash == 0 ? "/" : target.substr(0, slash));
+    std::string base = slash == std::string::npos ? target : target.substr(slash + 1);
     if (base.empty()) fail(EISDIR, "cannot save to");
     struct stat st {};
     mode_t mode = 0666;
-    if (::stat(path.c_str(), &st) == 0) {
+    if (::stat(target.c_str(), &st) == 0) {
         if (S_ISDIR(st.st_mode)) fail(EISDIR, "cannot save to");
         mode = st.st_mode & 07777;  // a replaced file keeps its permissions
     } else {
@@ -288,7 +299,8 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
                 mask = static_cast<mode_t>(std::strtol(line.c_str() + 6, nullptr, 8));
         mode &= ~mask;
     }
-    std::string temp = dir + "/." + base + ".XXXXXX";
+    // The temporary name stays within the file name length limit however long the target is.
+    std::string temp = dir + "/." + base.substr(0, 200) + ".XXXXXX";
     int fd = ::mkstemp(&temp[0]);
     if (fd < 0) fail(errno, "cannot save to");
     struct TempFile {
@@ -317,7 +329,7 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
     if (::fsync(fd) != 0) fail(errno, "cannot write");
     guard.fd = -1;
     if (::close(fd) != 0) fail(errno, "cannot write");
-    if (::rename(temp.c_str(), path.c_str()) != 0) fail(errno, "cannot save to");
+    if (::rename(temp.c_str(), target.c_str()) != 0) fail(errno, "cannot save to");
     guard.keep = true;
 }
 

@@ -169,6 +169,22 @@ TEST(DomSave, SaveReplacesAtomicallyAndReportsFailures) {
     EXPECT_EQ(st.st_mode & 0777, 0640u);  // the replaced file keeps its permissions
     EXPECT_EQ(dir.Entries(), std::vector<std::string>{"out.xml"});
 
+    // Through a symbolic link the file it points to is replaced; the link stays.
+    ASSERT_EQ(::symlink(target.c_str(), dir.File("link.xml").c_str()), 0);
+    WriteFile(target, "old content");
+    doc->save(_variant_t(dir.File("link.xml")));
+    struct stat link {};
+    ASSERT_EQ(::lstat(dir.File("link.xml").c_str(), &link), 0);
+    EXPECT_TRUE(S_ISLNK(link.st_mode));
+    EXPECT_EQ(ReadFile(target).rfind("<?xml", 0), 0u);
+    ::unlink(dir.File("link.xml").c_str());
+
+    // A name near the length limit still gets its temporary file.
+    std::string longName = dir.File(std::string(250, 'n') + ".xml");
+    doc->save(_variant_t(longName));
+    EXPECT_EQ(ReadFile(longName).rfind("<?xml", 0), 0u);
+    ::unlink(longName.c_str());
+
     struct Row {
         const char* label;
         std::string path;
