@@ -41,8 +41,23 @@ struct Builder {
         std::uint32_t h = 2166136261u;
         for (char c : name) h = (h ^ static_cast<unsigned char>(c)) * 16777619u;
         const DomName*& slot = nameCache[h & 511];
-        if (!slot || slot->qname != name) slot = store->Intern(name);
+        if (!slot || slot->qname != name) {
+            if (HasForeignNameChar(name)) Stop("not well-formed (invalid name character)");
+            slot = store->Intern(name);
+        }
         return slot;
+    }
+
+    // expat's ISO-8859-1 and UTF-16 decoders take U+00AA, U+00B5 and U+00BA for name
+    // characters, which XML does not (its UTF-8 decoder refuses them): such a name would be
+    // saved as a document that cannot be read back.
+    static bool HasForeignNameChar(std::string_view name) {
+        for (std::size_t i = 0; i + 1 < name.size(); ++i) {
+            if (static_cast<unsigned char>(name[i]) != 0xC2) continue;
+            unsigned char c = static_cast<unsigned char>(name[i + 1]);
+            if (c == 0xAA || c == 0xB5 || c == 0xBA) return true;
+        }
+        return false;
     }
 
     // Why the build stopped the parser, when it did.
@@ -173,7 +188,7 @@ void XMLCALL OnPI(void* data, const XML_Char* target, const XML_Char* pidata) {
     Guard(data, [&](Builder& b) {
         if (b.doctypeDepth > 0) return;
         b.Flush();
-        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.store->Intern(target));
+        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.Name(target));
         b.store->SetText(node, pidata ? pidata : "");
         LinkChild(b.current, node);
     });

@@ -58,6 +58,11 @@ TEST(DomLoad, BadInputFailsWithReasonAndLocationAndLeavesDocumentEmpty) {
         {"duplicate attribute", "<a b='1' b='2'/>", "duplicate attribute", 1},
         {"BOM contradicts declaration", "\xef\xbb\xbf<?xml version='1.0' encoding='ISO-8859-1'?><a/>",
          "encoding \"ISO-8859-1\" declared after a UTF-8 byte order mark at line 1", 1},
+        {"ordinal indicator in a name (ISO-8859-1)",
+         "<?xml version='1.0' encoding='ISO-8859-1'?>\n<a\xaa/>",
+         "not well-formed (invalid name character) at line 2", 2},
+        {"micro sign in a name (UTF-16)", std::string("\xff\xfe<\0a\0\xb5\0/\0>\0", 12),
+         "not well-formed (invalid name character) at line 1", 1},
         {"UTF-16 BOM on UTF-8 bytes", "\xff\xfe<a/>", "not well-formed", 1},
     };
     for (const Row& row : rows) {
