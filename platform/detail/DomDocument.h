@@ -31,7 +31,12 @@ public:
     std::size_t Footprint() const noexcept { return m_footprint; }
 
 private:
-    std::vector<std::unique_ptr<char[]>> m_chunks;
+    struct FreeChunk {
+        void operator()(char* p) const noexcept;
+    };
+    char* NewChunk(std::size_t size);
+
+    std::vector<std::unique_ptr<char, FreeChunk>> m_chunks;
     char* m_cursor = nullptr;
     std::size_t m_left = 0;
     std::size_t m_nextChunk = 16 * 1024;
