@@ -324,7 +324,14 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
     };
     std::string buffer;
     buffer.reserve(1024 * 1024 + 64 * 1024);
-    detail::WriteXml(document, buffer, write);
+    long unrepresentable = detail::WriteXml(document, buffer, write);
+    if (unrepresentable >= 0) {
+        // The file would not load again: refuse it rather than report a save that loses data.
+        char code[32];
+        std::snprintf(code, sizeof code, "U+%04lX", unrepresentable);
+        throw _com_error(E_FAIL, "cannot save " + path + ": the document holds character " +
+                                     code + ", which XML 1.0 cannot represent");
+    }
     if (::fchmod(fd, mode) != 0) fail(errno, "cannot save to");
     if (::fsync(fd) != 0) fail(errno, "cannot write");
     guard.fd = -1;

@@ -9,7 +9,29 @@ namespace {
 
 constexpr std::string_view kXmlNamespace = "http://www.w3.org/XML/1998/namespace";
 
+// The first character met that XML 1.0 cannot carry (a control character, U+FFFE, U+FFFF),
+// or -1. Per thread, reset by WriteXml.
+thread_local long t_unrepresentable = -1;
+
+void NoteUnrepresentable(long codePoint) {
+    if (t_unrepresentable < 0) t_unrepresentable = codePoint;
+}
+
+// Notes a character XML 1.0 cannot carry in raw text (CDATA, comments, instructions).
+void CheckRaw(std::string_view text) {
+    for (std::size_t i = 0; i < text.size(); ++i) {
+        unsigned char c = static_cast<unsigned char>(text[i]);
+        if (c < 0x20 && c != '\t' && c != '\n' && c != '\r') {
+            NoteUnrepresentable(c);
+        } else if (c == 0xEF && i + 2 < text.size() && static_cast<unsigned char>(text[i + 1]) == 0xBF &&
+                   (static_cast<unsigned char>(text[i + 2]) & 0xFE) == 0xBE) {
+            NoteUnrepresentable(0xFFFE + (static_cast<unsigned char>(text[i + 2]) & 1));
+        }
+    }
+}
+
 void AppendCharRef(std::string& out, unsigned char c) {
+    NoteUnrepresentable(c);
     out += "&#";
     out += std::to_string(static_cast<unsigned>(c));
     out += ';';
@@ -17,6 +39,7 @@ void AppendCharRef(std::string& out, unsigned char c) {
 
 // Writes text, escaping what must not appear raw. `attribute` selects the attribute rules.
 void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
+    if (text.find("\xEF\xBF") != std::string_view::npos) CheckRaw(text);  // U+FFFE, U+FFFF
     std::size_t run = 0;
     for (std::size_t i = 0; i < text.size(); ++i) {
         unsigned char c = static_cast<unsigned char>(text[i]);
@@ -54,25 +77,20 @@ void AppendAttribute(std::string& out, std::string_view name, std::string_view v
 }
 
 void AppendCdata(std::string& out, std::string_view text) {
-    out += "<![CDATA[";
-    std::size_t run = 0;
-    for (std::size_t i = 0; i < text.size(); ++i) {
-        if (text[i] == '\r') {
-            // A raw CR would read back as LF.
-            out.append(text.data() + run, i - run);
-            out += "]]>&#13;<![CDATA[";
-            run = i + 1;
-        } else if (text.compare(i, 3, "]]>") == 0) {
-            out.append(text.data() + run, i + 2 - run);
-            out += "]]><![CDATA[";
-            run = i + 2;
-        }
+    // "]]>" cannot appear in a CDATA section and a CR in one reads back as LF. Splitting the
+    // section would turn one value into several nodes; as escaped text it stays one value.
+    if (text.find("]]>") != std::string_view::npos || text.find('\r') != std::string_view::npos) {
+        AppendEscaped(out, text, false);
+        return;
     }
-    out.append(text.data() + run, text.size() - run);
+    CheckRaw(text);
+    out += "<![CDATA[";
+    out += text;
     out += "]]>";
 }
 
 void AppendComment(std::string& out, std::string_view text) {
+    CheckRaw(text);
     out += "<!--";
     for (std::size_t i = 0; i < text.size(); ++i) {
         out += text[i];
@@ -104,6 +122,7 @@ void AppendPI(std::string& out, const DomNode* node) {
         return;
     }
     std::string_view data = node->Text();
+    CheckRaw(data);
     if (!data.empty()) out += ' ';
     std::size_t run = 0;
     for (std::size_t i = 0; i + 1 < data.size(); ++i) {
@@ -226,7 +245,8 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
 
 }  // namespace
 
-void WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
+long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
+    t_unrepresentable = -1;
     if (node->type != NODE_DOCUMENT) {
         AppendSubtree(out, node, flush);
     } else {
@@ -239,6 +259,7 @@ void WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
         flush(out);
         out.clear();
     }
+    return t_unrepresentable;
 }
 
 }  // namespace detail

@@ -2,7 +2,8 @@
 // Serialises DOM content as UTF-8 XML text.
 //
 // What is written reads back to the same values: text escapes & < > and CR; attribute values
-// escape & < > " and TAB, LF, CR; CDATA sections are split around "]]>" and CR. Nodes made
+// escape & < > " and TAB, LF, CR; a CDATA section holding "]]>" or CR (which no CDATA section
+// can carry) is written as escaped text, so that its value stays in one node. Nodes made
 // with a namespace URI are declared through the in-scope default namespace (or their prefix)
 // only where the URI is not already in scope; parsed nodes are written as they are, and an
 // explicit xmlns attribute on an element always wins. Where XML has no way to write a value
@@ -27,7 +28,10 @@ using XmlFlush = std::function<void(std::string_view)>;
 /// Appends the XML text of `node` (its subtree included) to `out`. Iterative: any depth works.
 /// With `flush`, the text is handed over in pieces of about a megabyte as it grows (and `out`
 /// is left empty), so that large documents need no second copy of themselves in memory.
-void WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush = nullptr);
+/// Returns -1, or the first character met that XML 1.0 cannot carry (a control character other
+/// than TAB, LF, CR, or U+FFFE/U+FFFF): such text is written (as a character reference where
+/// escaped) but will not load again.
+long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush = nullptr);
 
 }  // namespace detail
 }  // namespace kest
