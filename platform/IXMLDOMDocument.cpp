@@ -45,7 +45,7 @@ std::vector<detail::SchemaRef> SchemaRefsOf(const DomNode* root) {
     std::vector<detail::SchemaRef> refs;
     if (!root) return refs;
     std::vector<std::string_view> prefixes;
-    for (const DomNode* a = root->firstAttribute; a; a = a->next) {
+    for (const DomNode* a = root->FirstAttribute(); a; a = a->next) {
         std::string_view name = a->Name();
         if (name.substr(0, 6) == "xmlns:" && a->Text() == kSchemaInstanceNs)
             prefixes.push_back(name.substr(6));
@@ -57,7 +57,7 @@ std::vector<detail::SchemaRef> SchemaRefsOf(const DomNode* root) {
             if (!prefix.empty() && p == prefix) return true;
         return false;
     };
-    for (const DomNode* a = root->firstAttribute; a; a = a->next) {
+    for (const DomNode* a = root->FirstAttribute(); a; a = a->next) {
         if (!a->name->prefixLength || !bound(a)) continue;
         std::string_view local = a->name->LocalName();
         std::string_view value = a->Text();
@@ -85,8 +85,8 @@ std::vector<detail::SchemaRef> SchemaRefsOf(const DomNode* root) {
 }
 
 const DomNode* RootElement(const DomNode* parentOfRoot) {
-    for (const DomNode* c = parentOfRoot->firstChild; c; c = c->next)
-        if (c->type == NODE_ELEMENT) return c;
+    for (const DomNode* c = parentOfRoot->FirstChild(); c; c = c->next)
+        if (c->Type() == NODE_ELEMENT) return c;
     return nullptr;
 }
 
@@ -377,12 +377,12 @@ IXMLDOMNodePtr IXMLDOMDocument::createNode(const _variant_t& type, const _bstr_t
         case NODE_ATTRIBUTE:
             if (!detail::IsXmlName(qname))
                 throw _com_error(E_FAIL, "not a valid name: \"" + qname + "\"");
-            node = m_doc->NewNode(kind, m_doc->Intern(qname, ns, true));
+            node = m_doc->NewNode(kind, m_doc->Intern(kind, qname, ns, true));
             break;
         case NODE_PROCESSING_INSTRUCTION:
             if (!detail::IsXmlName(qname))
                 throw _com_error(E_FAIL, "not a valid target: \"" + qname + "\"");
-            node = m_doc->NewNode(kind, m_doc->Intern(qname));
+            node = m_doc->NewNode(kind, m_doc->Intern(kind, qname));
             break;
         case NODE_TEXT:
         case NODE_CDATA_SECTION:
@@ -399,13 +399,13 @@ IXMLDOMNodePtr IXMLDOMDocument::createNode(const _variant_t& type, const _bstr_t
 IXMLDOMElementPtr IXMLDOMDocument::createElement(const _bstr_t& tagName) {
     std::string qname = Utf8(tagName);
     if (!detail::IsXmlName(qname)) throw _com_error(E_FAIL, "not a valid name: \"" + qname + "\"");
-    return IXMLDOMElementPtr(m_doc, m_doc->NewNode(NODE_ELEMENT, m_doc->Intern(qname, {}, true)));
+    return IXMLDOMElementPtr(m_doc, m_doc->NewNode(NODE_ELEMENT, m_doc->Intern(NODE_ELEMENT, qname, {}, true)));
 }
 
 IXMLDOMAttributePtr IXMLDOMDocument::createAttribute(const _bstr_t& name) {
     std::string qname = Utf8(name);
     if (!detail::IsXmlName(qname)) throw _com_error(E_FAIL, "not a valid name: \"" + qname + "\"");
-    return IXMLDOMAttributePtr(m_doc, m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(qname)));
+    return IXMLDOMAttributePtr(m_doc, m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(NODE_ATTRIBUTE, qname)));
 }
 
 IXMLDOMTextPtr IXMLDOMDocument::createTextNode(const _bstr_t& data) {
@@ -424,7 +424,7 @@ IXMLDOMProcessingInstructionPtr IXMLDOMDocument::createProcessingInstruction(
     const _bstr_t& target, const _bstr_t& data) {
     std::string name = Utf8(target);
     if (!detail::IsXmlName(name)) throw _com_error(E_FAIL, "not a valid target: \"" + name + "\"");
-    DomNode* node = m_doc->NewNode(NODE_PROCESSING_INSTRUCTION, m_doc->Intern(name));
+    DomNode* node = m_doc->NewNode(NODE_PROCESSING_INSTRUCTION, m_doc->Intern(NODE_PROCESSING_INSTRUCTION, name));
     if (node->IsDeclaration())
         detail::SetDeclarationText(*m_doc, node, Utf8(data));
     else

@@ -25,20 +25,14 @@ _variant_t NullVariant() {
 
 }  // namespace
 
-DOMNodeType IXMLDOMNode::GetnodeType() const { return static_cast<DOMNodeType>(m_node->type); }
+DOMNodeType IXMLDOMNode::GetnodeType() const { return static_cast<DOMNodeType>(m_node->Type()); }
 
 _bstr_t IXMLDOMNode::GetnodeName() const {
-    switch (m_node->type) {
-        case NODE_TEXT: return _bstr_t(u"#text");
-        case NODE_CDATA_SECTION: return _bstr_t(u"#cdata-section");
-        case NODE_COMMENT: return _bstr_t(u"#comment");
-        case NODE_DOCUMENT: return _bstr_t(u"#document");
-        default: return ToBstr(m_node->Name());
-    }
+    return ToBstr(m_node->Name());  // kinds without a name have "#text", "#comment", ...
 }
 
 _variant_t IXMLDOMNode::GetnodeValue() const {
-    switch (m_node->type) {
+    switch (m_node->Type()) {
         case NODE_ATTRIBUTE:
         case NODE_TEXT:
         case NODE_CDATA_SECTION:
@@ -53,7 +47,7 @@ _variant_t IXMLDOMNode::GetnodeValue() const {
 }
 
 void IXMLDOMNode::PutnodeValue(const _variant_t& value) {
-    if (m_node->type == NODE_ELEMENT || m_node->type == NODE_DOCUMENT)
+    if (m_node->Type() == NODE_ELEMENT || m_node->Type() == NODE_DOCUMENT)
         throw _com_error(E_FAIL, "elements and documents have no value of their own");
     _bstr_t text = value;  // a value that cannot become text fails here
     std::string utf8 = Utf16ToUtf8(text.View());
@@ -70,13 +64,13 @@ _bstr_t IXMLDOMNode::GetnamespaceURI() const {
 }
 
 _bstr_t IXMLDOMNode::Gettext() const {
-    if (m_node->type != NODE_ELEMENT && m_node->type != NODE_DOCUMENT) {
+    if (m_node->Type() != NODE_ELEMENT && m_node->Type() != NODE_DOCUMENT) {
         _variant_t value = GetnodeValue();
         return value.vt == VT_BSTR ? _bstr_t(value.bstrVal, true) : _bstr_t(u"");
     }
     std::string text;
-    for (DomNode* n = m_node->firstChild; n; n = detail::NextInSubtree(m_node, n)) {
-        if (n->type == NODE_TEXT || n->type == NODE_CDATA_SECTION) text += n->Text();
+    for (DomNode* n = m_node->FirstChild(); n; n = detail::NextInSubtree(m_node, n)) {
+        if (n->Type() == NODE_TEXT || n->Type() == NODE_CDATA_SECTION) text += n->Text();
     }
     return ToBstr(text);
 }
@@ -97,30 +91,30 @@ IXMLDOMNamedNodeMapPtr IXMLDOMNode::Getattributes() const {
 }
 
 IXMLDOMNodePtr IXMLDOMNode::GetparentNode() const {
-    if (m_node->type == NODE_ATTRIBUTE) return nullptr;
+    if (m_node->Type() == NODE_ATTRIBUTE) return nullptr;
     return IXMLDOMNodePtr(m_doc, m_node->parent);
 }
 
-IXMLDOMNodePtr IXMLDOMNode::GetfirstChild() const { return IXMLDOMNodePtr(m_doc, m_node->firstChild); }
+IXMLDOMNodePtr IXMLDOMNode::GetfirstChild() const { return IXMLDOMNodePtr(m_doc, m_node->FirstChild()); }
 
-IXMLDOMNodePtr IXMLDOMNode::GetlastChild() const { return IXMLDOMNodePtr(m_doc, m_node->lastChild); }
+IXMLDOMNodePtr IXMLDOMNode::GetlastChild() const { return IXMLDOMNodePtr(m_doc, m_node->LastChild()); }
 
 IXMLDOMNodePtr IXMLDOMNode::GetnextSibling() const {
-    if (m_node->type == NODE_ATTRIBUTE) return nullptr;
+    if (m_node->Type() == NODE_ATTRIBUTE) return nullptr;
     return IXMLDOMNodePtr(m_doc, m_node->next);
 }
 
 IXMLDOMNodePtr IXMLDOMNode::GetpreviousSibling() const {
-    if (m_node->type == NODE_ATTRIBUTE) return nullptr;
+    if (m_node->Type() == NODE_ATTRIBUTE) return nullptr;
     return IXMLDOMNodePtr(m_doc, m_node->prev);
 }
 
 VARIANT_BOOL IXMLDOMNode::hasChildNodes() const {
-    return m_node->firstChild ? VARIANT_TRUE : VARIANT_FALSE;
+    return m_node->FirstChild() ? VARIANT_TRUE : VARIANT_FALSE;
 }
 
 IXMLDOMDocumentPtr IXMLDOMNode::GetownerDocument() const {
-    if (m_node->type == NODE_DOCUMENT) return nullptr;
+    if (m_node->Type() == NODE_DOCUMENT) return nullptr;
     return IXMLDOMDocumentPtr(m_doc, &m_doc->node);
 }
 
@@ -130,24 +124,24 @@ IXMLDOMNodePtr IXMLDOMNode::appendChild(const IXMLDOMNodePtr& child) {
     DomNode* node = DomDocument::NodeOf(handle);
     if (DomDocument::DocumentOf(handle) != m_doc)
         throw _com_error(E_INVALIDARG, "the node belongs to another document");
-    if (m_node->type != NODE_ELEMENT && m_node->type != NODE_DOCUMENT)
+    if (m_node->Type() != NODE_ELEMENT && m_node->Type() != NODE_DOCUMENT)
         throw _com_error(E_INVALIDARG, "this kind of node cannot have children");
-    switch (node->type) {
+    switch (node->Type()) {
         case NODE_ELEMENT:
         case NODE_PROCESSING_INSTRUCTION:
         case NODE_COMMENT:
             break;
         case NODE_TEXT:
         case NODE_CDATA_SECTION:
-            if (m_node->type == NODE_DOCUMENT)
+            if (m_node->Type() == NODE_DOCUMENT)
                 throw _com_error(E_INVALIDARG, "text cannot be a child of the document");
             break;
         default:
             throw _com_error(E_INVALIDARG, "this kind of node cannot be a child");
     }
-    if (m_node->type == NODE_DOCUMENT && node->type == NODE_ELEMENT) {
-        for (DomNode* c = m_node->firstChild; c; c = c->next)
-            if (c->type == NODE_ELEMENT && c != node)
+    if (m_node->Type() == NODE_DOCUMENT && node->Type() == NODE_ELEMENT) {
+        for (DomNode* c = m_node->FirstChild(); c; c = c->next)
+            if (c->Type() == NODE_ELEMENT && c != node)
                 throw _com_error(E_INVALIDARG, "the document already has a root element");
     }
     for (DomNode* a = m_node; a; a = a->parent)
@@ -173,7 +167,7 @@ void IXMLDOMElement::setAttribute(const _bstr_t& name, const _variant_t& value) 
     _bstr_t text = value;
     DomNode* a = detail::FindAttribute(m_node, qname);
     if (!a) {
-        a = m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(qname));
+        a = m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(NODE_ATTRIBUTE, qname));
         detail::LinkAttribute(m_node, a);
         ++m_doc->generation;
     }

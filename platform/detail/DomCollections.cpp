@@ -94,7 +94,7 @@ public:
             if (old->prev)
                 old->prev->next = node;
             else
-                owner->firstAttribute = node;
+                owner->SetFirstAttribute(node);
             if (old->next) old->next->prev = node;
             old->parent = old->prev = old->next = nullptr;
         } else {

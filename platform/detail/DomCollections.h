@@ -19,7 +19,7 @@ public:
     DomChain& operator=(const DomChain&) = delete;
 
     DomNode* First() const noexcept {
-        return m_attributes ? m_owner->firstAttribute : m_owner->firstChild;
+        return m_attributes ? m_owner->FirstAttribute() : m_owner->FirstChild();
     }
     IXMLDOMNodePtr Next();
     void Reset() noexcept { m_started = false; }

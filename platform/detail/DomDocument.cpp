@@ -7,6 +7,7 @@
 #include <cstring>
 #include <limits>
 #include <new>
+#include <stdexcept>
 
 #include "../IXMLDOMDocument.h"
 
@@ -66,19 +67,44 @@ const char* Arena::Copy(std::string_view text) {
     return p;
 }
 
+namespace {
+DomName MakeKindName(DOMNodeType type, std::string_view qname, bool container) {
+    DomName name;
+    name.qname = qname;
+    name.type = static_cast<std::uint8_t>(type);
+    name.container = container;
+    return name;
+}
+const DomName kDocumentName = MakeKindName(NODE_DOCUMENT, "#document", true);
+const DomName kTextName = MakeKindName(NODE_TEXT, "#text", false);
+const DomName kCdataName = MakeKindName(NODE_CDATA_SECTION, "#cdata-section", false);
+const DomName kCommentName = MakeKindName(NODE_COMMENT, "#comment", false);
+}  // namespace
+
+const DomName* KindName(DOMNodeType type) noexcept {
+    switch (type) {
+        case NODE_DOCUMENT: return &kDocumentName;
+        case NODE_TEXT: return &kTextName;
+        case NODE_CDATA_SECTION: return &kCdataName;
+        case NODE_COMMENT: return &kCommentName;
+        default: return nullptr;
+    }
+}
+
 DomDocument::DomDocument() {
-    node.type = NODE_DOCUMENT;
+    node.name = &kDocumentName;
     stores.push_back(std::make_unique<DomStore>());
     g_liveDocuments.fetch_add(1, std::memory_order_relaxed);
 }
 
 DomDocument::~DomDocument() { g_liveDocuments.fetch_sub(1, std::memory_order_relaxed); }
 
-const DomName* DomStore::Intern(std::string_view qname, std::string_view namespaceURI,
-                                bool created) {
-    // Key: flag, namespace, NUL, qualified name. A namespace URI read from XML has no NUL.
+const DomName* DomStore::Intern(DOMNodeType type, std::string_view qname,
+                                std::string_view namespaceURI, bool created) {
+    // Key: kind, flag, namespace, NUL, qualified name. A namespace URI read from XML has no NUL.
     key.clear();
-    key.reserve(qname.size() + namespaceURI.size() + 2);
+    key.reserve(qname.size() + namespaceURI.size() + 3);
+    key.push_back(static_cast<char>('A' + type));
     key.push_back(created ? '1' : '0');
     key.append(namespaceURI);
     key.push_back('\0');
@@ -88,8 +114,11 @@ const DomName* DomStore::Intern(std::string_view qname, std::string_view namespa
     const char* stored = arena.Copy(key);
     std::string_view storedKey(stored, key.size());
     auto* name = new (arena.Allocate(sizeof(DomName), alignof(DomName))) DomName();
-    name->namespaceURI = storedKey.substr(1, namespaceURI.size());
-    name->qname = storedKey.substr(namespaceURI.size() + 2);
+    name->namespaceURI = storedKey.substr(2, namespaceURI.size());
+    name->qname = storedKey.substr(namespaceURI.size() + 3);
+    name->type = static_cast<std::uint8_t>(type);
+    name->container =
+        type == NODE_ELEMENT || (type == NODE_PROCESSING_INSTRUCTION && qname == "xml");
     name->created = created;
     std::size_t colon = name->qname.find(':');
     name->prefixLength =
@@ -100,25 +129,25 @@ const DomName* DomStore::Intern(std::string_view qname, std::string_view namespa
 
 DomNode* DomStore::NewNode(DOMNodeType type, const DomName* name) {
     auto* n = new (arena.Allocate(sizeof(DomNode), alignof(DomNode))) DomNode();
-    n->type = static_cast<std::uint8_t>(type);
-    n->name = name;
-    n->text = "";
+    n->name = name ? name : KindName(type);
+    if (!n->name) throw std::invalid_argument("a node of this kind needs a name");
+    if (!n->IsContainer()) n->SetTextStorage("", 0);
     return n;
 }
 
 void DomStore::SetText(DomNode* n, std::string_view text) {
     if (text.size() > std::numeric_limits<std::uint32_t>::max()) throw std::bad_alloc();
-    n->text = arena.Copy(text);
-    n->textLength = static_cast<std::uint32_t>(text.size());
+    n->SetTextStorage(arena.Copy(text), static_cast<std::uint32_t>(text.size()));
 }
 
 void DomDocument::Clear() {
-    for (DomNode* child = node.firstChild; child;) {
+    for (DomNode* child = node.FirstChild(); child;) {
         DomNode* next = child->next;
         child->parent = child->prev = child->next = nullptr;
         child = next;
     }
-    node.firstChild = node.lastChild = nullptr;
+    node.SetFirstChild(nullptr);
+    node.SetLastChild(nullptr);
     ++generation;
     if (refs == 1) {
         // Only the caller's document pointer is left: no node of the old content is reachable.
@@ -131,10 +160,11 @@ void DomDocument::Install(std::unique_ptr<DomStore> store, DomNode* top) {
     Clear();
     if (refs == 1) stores.clear();
     stores.push_back(std::move(store));
-    for (DomNode* child = top->firstChild; child; child = child->next) child->parent = &node;
-    node.firstChild = top->firstChild;
-    node.lastChild = top->lastChild;
-    top->firstChild = top->lastChild = nullptr;
+    for (DomNode* child = top->FirstChild(); child; child = child->next) child->parent = &node;
+    node.SetFirstChild(top->FirstChild());
+    node.SetLastChild(top->LastChild());
+    top->SetFirstChild(nullptr);
+    top->SetLastChild(nullptr);
 }
 
 long DomDocument::EffectiveMaxDepth() const noexcept {
@@ -144,50 +174,51 @@ long DomDocument::EffectiveMaxDepth() const noexcept {
 void LinkChild(DomNode* parent, DomNode* child) noexcept {
     child->parent = parent;
     child->next = nullptr;
-    child->prev = parent->lastChild;
-    if (parent->lastChild)
-        parent->lastChild->next = child;
+    DomNode* last = parent->LastChild();
+    child->prev = last;
+    if (last)
+        last->next = child;
     else
-        parent->firstChild = child;
-    parent->lastChild = child;
+        parent->SetFirstChild(child);
+    parent->SetLastChild(child);
 }
 
 void LinkAttribute(DomNode* owner, DomNode* attribute) noexcept {
     attribute->parent = owner;
     attribute->next = nullptr;
-    DomNode* last = owner->firstAttribute;
+    DomNode* last = owner->FirstAttribute();
     while (last && last->next) last = last->next;
     attribute->prev = last;
     if (last)
         last->next = attribute;
     else
-        owner->firstAttribute = attribute;
+        owner->SetFirstAttribute(attribute);
 }
 
 void Unlink(DomNode* n) noexcept {
     DomNode* parent = n->parent;
     if (!parent) return;
-    if (n->type == NODE_ATTRIBUTE) {
+    if (n->Type() == NODE_ATTRIBUTE) {
         if (n->prev)
             n->prev->next = n->next;
         else
-            parent->firstAttribute = n->next;
+            parent->SetFirstAttribute(n->next);
         if (n->next) n->next->prev = n->prev;
     } else {
         if (n->prev)
             n->prev->next = n->next;
         else
-            parent->firstChild = n->next;
+            parent->SetFirstChild(n->next);
         if (n->next)
             n->next->prev = n->prev;
         else
-            parent->lastChild = n->prev;
+            parent->SetLastChild(n->prev);
     }
     n->parent = n->prev = n->next = nullptr;
 }
 
 DomNode* FindAttribute(const DomNode* owner, std::string_view qname) noexcept {
-    for (DomNode* a = owner->firstAttribute; a; a = a->next)
+    for (DomNode* a = owner->FirstAttribute(); a; a = a->next)
         if (a->Name() == qname) return a;
     return nullptr;
 }
@@ -203,7 +234,7 @@ void DomRelease(DomDocument* document) noexcept {
 }  // namespace detail
 
 bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept {
-    return node && node->type == type;
+    return node && node->name->type == type;
 }
 
 }  // namespace kest

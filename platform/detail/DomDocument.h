@@ -43,10 +43,16 @@ private:
     std::size_t m_footprint = 0;
 };
 
-/// An interned qualified name together with the namespace a node was created in.
+/// An interned qualified name together with the kind of node it names and the namespace a
+/// node was created in. Every node has one; text, CDATA, comment and document nodes share
+/// constant names ("#text", ...).
 struct DomName {
     std::string_view qname;
     std::string_view namespaceURI;
+    std::uint8_t type = NODE_INVALID;
+    /// Elements, documents and the XML declaration hold children or attributes; every other
+    /// node holds text.
+    bool container = false;
     /// True for names of nodes made through createNode/createElement/createAttribute: the saver
     /// then declares namespaceURI where it is not in scope. Parsed names are written as they are.
     bool created = false;
@@ -58,26 +64,63 @@ struct DomName {
     }
 };
 
+/// The shared name of text, CDATA, comment and document nodes.
+const DomName* KindName(DOMNodeType type) noexcept;
+
+/// A node: 56 bytes. Containers and text holders share storage, told apart by the name.
 struct DomNode {
+    DomNode() noexcept : m_links{nullptr, nullptr, nullptr} {}
+
     DomNode* parent = nullptr;  // for an attribute: its owner element or declaration
-    DomNode* firstChild = nullptr;
-    DomNode* lastChild = nullptr;
     DomNode* prev = nullptr;
     DomNode* next = nullptr;
-    DomNode* firstAttribute = nullptr;  // elements and the XML declaration only
-    const DomName* name = nullptr;      // null for text, CDATA, comment, document
-    const char* text = nullptr;         // UTF-8 value of leaves, not zero-terminated
-    std::uint32_t textLength = 0;
-    std::uint8_t type = NODE_INVALID;
+    const DomName* name = nullptr;
 
-    std::string_view Text() const noexcept { return std::string_view(text, textLength); }
-    std::string_view Name() const noexcept { return name ? name->qname : std::string_view(); }
-    bool IsDeclaration() const noexcept {
-        return type == NODE_PROCESSING_INSTRUCTION && name && name->qname == "xml";
+    DOMNodeType Type() const noexcept { return static_cast<DOMNodeType>(name->type); }
+    bool IsContainer() const noexcept { return name->container; }
+    DomNode* FirstChild() const noexcept { return IsContainer() ? m_links.first : nullptr; }
+    DomNode* LastChild() const noexcept { return IsContainer() ? m_links.last : nullptr; }
+    /// Elements and the XML declaration only (null for every other node).
+    DomNode* FirstAttribute() const noexcept {
+        return IsContainer() ? m_links.attributes : nullptr;
     }
-    bool HasAttributes() const noexcept { return type == NODE_ELEMENT || IsDeclaration(); }
+    /// UTF-8 value of a text holder; empty for containers.
+    std::string_view Text() const noexcept {
+        return IsContainer() ? std::string_view() : std::string_view(m_text.data, m_text.length);
+    }
+    std::string_view Name() const noexcept { return name->qname; }
+    bool IsDeclaration() const noexcept {
+        return name->type == NODE_PROCESSING_INSTRUCTION && name->container;
+    }
+    bool HasAttributes() const noexcept { return name->type == NODE_ELEMENT || IsDeclaration(); }
+
+    // Containers only.
+    void SetFirstChild(DomNode* n) noexcept { m_links.first = n; }
+    void SetLastChild(DomNode* n) noexcept { m_links.last = n; }
+    void SetFirstAttribute(DomNode* n) noexcept { m_links.attributes = n; }
+    // Text holders only; `data` lives in the document's arena.
+    void SetTextStorage(const char* data, std::uint32_t length) noexcept {
+        m_text.data = data;
+        m_text.length = length;
+    }
+
+private:
+    struct Links {
+        DomNode* first;
+        DomNode* last;
+        DomNode* attributes;
+    };
+    struct TextSpan {
+        const char* data;
+        std::uint32_t length;
+    };
+    union {
+        Links m_links;
+        TextSpan m_text;
+    };
 };
 static_assert(std::is_trivially_destructible<DomNode>::value, "nodes are freed with the arena");
+static_assert(sizeof(DomNode) <= 56 || sizeof(void*) != 8, "keep nodes small");
 
 /// Details of the last load or validation.
 struct DomError {
@@ -98,8 +141,10 @@ struct DomStore {
     std::unordered_map<std::string_view, const char*> blanks;
     std::string key;  // scratch for Intern
 
-    const DomName* Intern(std::string_view qname, std::string_view namespaceURI = {},
-                          bool created = false);
+    /// The interned name of a node of `type` (element, attribute or processing instruction).
+    const DomName* Intern(DOMNodeType type, std::string_view qname,
+                          std::string_view namespaceURI = {}, bool created = false);
+    /// A new unattached node; `name` null for text, CDATA, comment and document nodes.
     DomNode* NewNode(DOMNodeType type, const DomName* name = nullptr);
     void SetText(DomNode* node, std::string_view text);
 };
@@ -136,9 +181,9 @@ struct DomDocument {
 
     DomStore& Store() { return *stores.back(); }
     /// The interned name for (qname, namespace, created).
-    const DomName* Intern(std::string_view qname, std::string_view namespaceURI = {},
-                          bool created = false) {
-        return Store().Intern(qname, namespaceURI, created);
+    const DomName* Intern(DOMNodeType type, std::string_view qname,
+                          std::string_view namespaceURI = {}, bool created = false) {
+        return Store().Intern(type, qname, namespaceURI, created);
     }
     /// A new unattached node of this document.
     DomNode* NewNode(DOMNodeType type, const DomName* name = nullptr) {
@@ -162,7 +207,7 @@ void LinkAttribute(DomNode* owner, DomNode* attribute) noexcept;
 DomNode* FindAttribute(const DomNode* owner, std::string_view qname) noexcept;
 /// The next node of `root`'s subtree in document order (attributes excluded), or null.
 inline DomNode* NextInSubtree(const DomNode* root, DomNode* node) noexcept {
-    if (node->firstChild) return node->firstChild;
+    if (DomNode* child = node->FirstChild()) return child;
     while (node != root) {
         if (node->next) return node->next;
         node = node->parent;

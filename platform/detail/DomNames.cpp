@@ -27,7 +27,7 @@ bool IsXmlName(std::string_view name) noexcept {
 
 std::string DeclarationText(const DomNode* declaration) {
     std::string text;
-    for (const DomNode* a = declaration->firstAttribute; a; a = a->next) {
+    for (const DomNode* a = declaration->FirstAttribute(); a; a = a->next) {
         if (!text.empty()) text += ' ';
         text += a->Name();
         text += "=\"";
@@ -61,9 +61,9 @@ void SetDeclarationText(DomDocument& document, DomNode* declaration, std::string
         pairs.emplace_back(name, text.substr(i, end - i));
         i = end + 1;
     }
-    while (declaration->firstAttribute) Unlink(declaration->firstAttribute);
+    while (DomNode* a = declaration->FirstAttribute()) Unlink(a);
     for (const auto& p : pairs) {
-        DomNode* a = document.NewNode(NODE_ATTRIBUTE, document.Intern(p.first));
+        DomNode* a = document.NewNode(NODE_ATTRIBUTE, document.Intern(NODE_ATTRIBUTE, p.first));
         document.SetText(a, p.second);
         LinkAttribute(declaration, a);
     }

@@ -36,14 +36,14 @@ struct Builder {
     // table spares the key building and hashing of most lookups.
     const DomName* nameCache[512] = {};
 
-    const DomName* Name(const XML_Char* raw) {
+    const DomName* Name(DOMNodeType type, const XML_Char* raw) {
         std::string_view name(raw);
-        std::uint32_t h = 2166136261u;
+        std::uint32_t h = 2166136261u ^ static_cast<std::uint32_t>(type);
         for (char c : name) h = (h ^ static_cast<unsigned char>(c)) * 16777619u;
         const DomName*& slot = nameCache[h & 511];
-        if (!slot || slot->qname != name) {
+        if (!slot || slot->type != type || slot->qname != name) {
             if (HasForeignNameChar(name)) Stop("not well-formed (invalid name character)");
-            slot = store->Intern(name);
+            slot = store->Intern(type, name);
         }
         return slot;
     }
@@ -87,8 +87,7 @@ struct Builder {
                 const char* stored = store->arena.Copy(text);
                 it = store->blanks.emplace(std::string_view(stored, text.size()), stored).first;
             }
-            node->text = it->second;
-            node->textLength = static_cast<std::uint32_t>(text.size());
+            node->SetTextStorage(it->second, static_cast<std::uint32_t>(text.size()));
         } else {
             store->SetText(node, text);
         }
@@ -123,17 +122,17 @@ void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
             b.Stop("element nesting deeper than " + std::to_string(b.maxDepth));
             return;
         }
-        DomNode* element = b.store->NewNode(NODE_ELEMENT, b.Name(name));
+        DomNode* element = b.store->NewNode(NODE_ELEMENT, b.Name(NODE_ELEMENT, name));
         DomNode* lastAttribute = nullptr;
         for (const XML_Char** a = atts; *a; a += 2) {
-            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.Name(a[0]));
+            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.Name(NODE_ATTRIBUTE, a[0]));
             b.store->SetText(attribute, a[1]);
             attribute->parent = element;
             attribute->prev = lastAttribute;
             if (lastAttribute)
                 lastAttribute->next = attribute;
             else
-                element->firstAttribute = attribute;
+                element->SetFirstAttribute(attribute);
             lastAttribute = attribute;
         }
         LinkChild(b.current, element);
@@ -188,7 +187,7 @@ void XMLCALL OnPI(void* data, const XML_Char* target, const XML_Char* pidata) {
     Guard(data, [&](Builder& b) {
         if (b.doctypeDepth > 0) return;
         b.Flush();
-        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.Name(target));
+        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.Name(NODE_PROCESSING_INSTRUCTION, target));
         b.store->SetText(node, pidata ? pidata : "");
         LinkChild(b.current, node);
     });
@@ -204,9 +203,10 @@ void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* enco
                    "\" declared after a UTF-8 byte order mark");
             return;
         }
-        DomNode* decl = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.store->Intern("xml"));
+        DomNode* decl = b.store->NewNode(NODE_PROCESSING_INSTRUCTION,
+                                          b.store->Intern(NODE_PROCESSING_INSTRUCTION, "xml"));
         auto add = [&](const char* name, std::string_view value) {
-            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(name));
+            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(NODE_ATTRIBUTE, name));
             b.store->SetText(attribute, value);
             LinkAttribute(decl, attribute);
         };

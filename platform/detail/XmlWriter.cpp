@@ -111,7 +111,7 @@ void AppendPI(std::string& out, const DomNode* node) {
     if (node->IsDeclaration()) {
         const DomNode* version = FindAttribute(node, "version");
         AppendAttribute(out, "version", version ? version->Text() : "1.0");
-        for (const DomNode* a = node->firstAttribute; a; a = a->next) {
+        for (const DomNode* a = node->FirstAttribute(); a; a = a->next) {
             if (a == version) continue;
             if (a->Name() == "encoding" && !IsUtf8Name(a->Text()))
                 AppendAttribute(out, "encoding", "UTF-8");
@@ -167,7 +167,7 @@ std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scop
     std::size_t mark = scope.Mark();
     out += '<';
     out += element->Name();
-    for (const DomNode* a = element->firstAttribute; a; a = a->next) {
+    for (const DomNode* a = element->FirstAttribute(); a; a = a->next) {
         std::string_view name = a->Name();
         if (name == "xmlns")
             scope.Bind("", a->Text());
@@ -189,14 +189,14 @@ std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scop
         scope.Bind(prefix, n->namespaceURI);
     };
     declare(element->name, true);
-    for (const DomNode* a = element->firstAttribute; a; a = a->next) declare(a->name, false);
-    for (const DomNode* a = element->firstAttribute; a; a = a->next)
+    for (const DomNode* a = element->FirstAttribute(); a; a = a->next) declare(a->name, false);
+    for (const DomNode* a = element->FirstAttribute(); a; a = a->next)
         AppendAttribute(out, a->Name(), a->Text());
     return mark;
 }
 
 void AppendLeaf(std::string& out, const DomNode* node) {
-    switch (node->type) {
+    switch (node->Type()) {
         case NODE_TEXT: AppendEscaped(out, node->Text(), false); break;
         case NODE_CDATA_SECTION: AppendCdata(out, node->Text()); break;
         case NODE_COMMENT: AppendComment(out, node->Text()); break;
@@ -213,12 +213,12 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
     std::vector<std::size_t> marks;
     const DomNode* node = root;
     for (;;) {
-        if (node->type == NODE_ELEMENT) {
+        if (node->Type() == NODE_ELEMENT) {
             std::size_t mark = AppendStartTag(out, node, scope);
-            if (node->firstChild) {
+            if (node->FirstChild()) {
                 out += '>';
                 marks.push_back(mark);
-                node = node->firstChild;
+                node = node->FirstChild();
                 continue;
             }
             out += "/>";
@@ -247,10 +247,10 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
 
 long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
     t_unrepresentable = -1;
-    if (node->type != NODE_DOCUMENT) {
+    if (node->Type() != NODE_DOCUMENT) {
         AppendSubtree(out, node, flush);
     } else {
-        for (const DomNode* child = node->firstChild; child; child = child->next) {
+        for (const DomNode* child = node->FirstChild(); child; child = child->next) {
             AppendSubtree(out, child, flush);
             out += '\n';
         }
