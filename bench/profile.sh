@@ -37,8 +37,10 @@ for run in "${runs[@]}"; do
   echo "== $name ($items items)"
   # shellcheck disable=SC2086
   if $use_perf; then
-    perf record -q -F 2000 --call-graph dwarf,16384 -o "$work/$name.data" -- \
-      "$bin/peakmem" $args >/dev/null 2>&1
+    if ! perf record -q -F 2000 --call-graph dwarf,16384 -o "$work/$name.data" -- \
+      "$bin/peakmem" $args >"$work/$name.log" 2>&1; then
+      echo "peakmem $args failed:"; cat "$work/$name.log"; continue
+    fi
     # Inclusive shares within the operation: of the samples whose call chain passes through
     # the operation's function, the share in which each function appears.
     perf script -i "$work/$name.data" -F ip,sym 2>/dev/null |
@@ -59,11 +61,13 @@ for run in "${runs[@]}"; do
           for (s in count) printf "%6.1f%%  %s\n", 100 * count[s] / total, substr(s, 1, 150)
         }' | sort -rn |
       grep -vE '  (main|_start|__libc_start_main_impl|__libc_start_call_main|\[unknown\])$' |
-      head -40
+      awk 'NR <= 40'
   else
-    valgrind -q --tool=callgrind --callgrind-out-file="$work/$name.out" \
-      --toggle-collect="${root}*" "$bin/peakmem" $args >/dev/null 2>&1
+    if ! valgrind -q --tool=callgrind --callgrind-out-file="$work/$name.out" \
+      --toggle-collect="${root}*" "$bin/peakmem" $args >"$work/$name.log" 2>&1; then
+      echo "peakmem $args failed:"; cat "$work/$name.log"; continue
+    fi
     callgrind_annotate --inclusive=yes "$work/$name.out" 2>/dev/null |
-      grep -E '^ *[0-9,]+ +\(' | head -40 | cut -c1-170
+      grep -E '^ *[0-9,]+ +\(' | awk 'NR <= 40' | cut -c1-170
   fi
 done
