@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "AtlException.h"
+#include "BstrT.h"
 
 namespace kest {
 
@@ -55,6 +56,9 @@ CComBSTR::CComBSTR(const char* utf8) {
 }
 
 CComBSTR::CComBSTR(std::u16string_view text) : m_str(AllocView(text)) {}
+
+CComBSTR::CComBSTR(const _bstr_t& text)
+    : m_str(static_cast<const OLECHAR*>(text) ? AllocView(text.View()) : nullptr) {}
 
 CComBSTR::CComBSTR(const std::string& utf8)
     : m_str(CheckedAlloc(SysAllocStringFromUtf8(utf8))) {}

@@ -8,6 +8,8 @@
 
 namespace kest {
 
+class _bstr_t;
+
 class CComBSTR {
 public:
     CComBSTR() noexcept = default;
@@ -17,6 +19,8 @@ public:
     CComBSTR(const OLECHAR* text);            // null gives a null string
     CComBSTR(const char* utf8);               // null gives a null string
     CComBSTR(std::u16string_view text);
+    /// A copy of the text of a _bstr_t (null gives a null string).
+    CComBSTR(const _bstr_t& text);
     explicit CComBSTR(const std::string& utf8);
     CComBSTR(const CComBSTR& other);
     CComBSTR(CComBSTR&& other) noexcept;
