@@ -7,9 +7,15 @@ execute_process(COMMAND ${CMAKE_COMMAND} --install ${KEST_BINARY_DIR} --prefix $
 if(NOT rc EQUAL 0)
   message(FATAL_ERROR "install failed: ${rc}")
 endif()
+# A sanitized library needs its runtime linked into the host as well.
+set(extra_flags "")
+if(KEST_SANITIZE)
+  set(extra_flags "-fsanitize=address,undefined")
+endif()
 execute_process(COMMAND ${CMAKE_COMMAND} -S ${KEST_SOURCE_DIR}/tests/consumer/project
                 -B ${KEST_WORK_DIR}/build -G ${KEST_GENERATOR}
                 -DCMAKE_BUILD_TYPE=${KEST_BUILD_TYPE} -DCMAKE_PREFIX_PATH=${prefix}
+                "-DCMAKE_CXX_FLAGS=${extra_flags}"
                 RESULT_VARIABLE rc)
 if(NOT rc EQUAL 0)
   message(FATAL_ERROR "consumer configure failed: ${rc}")
