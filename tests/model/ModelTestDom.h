@@ -73,6 +73,36 @@ inline KestCdfNormalizedString Ns(const char16_t* text) {
     return KestCdfNormalizedString(CComBSTR(text));
 }
 
+/// Writes `object` with `write(object, parent, doc)` below a fresh element of a fresh document
+/// and returns the first child element written there.
+template <class T, class Write>
+IXMLDOMNodePtr WriteBelow(T& object, IXMLDOMDocument2Ptr& doc, Write write) {
+    doc = NewDocument();
+    IXMLDOMNodePtr parent = doc->createElement(_bstr_t(u"PARENT"));
+    doc->appendChild(parent);
+    write(object, parent, doc);
+    IXMLDOMNodePtr child = parent->GetfirstChild();
+    while (child && child->GetnodeType() != NODE_ELEMENT) child = child->GetnextSibling();
+    return child;
+}
+
+/// Reads `xml` into a T, writes it, reads what was written into another T and writes that: both
+/// writes must give `expected`.
+template <class T, class Read, class Write>
+void ExpectRoundTrip(const std::u16string& xml, const std::string& expected, Read read,
+                     Write write) {
+    IXMLDOMDocument2Ptr source, first, second;
+    T once, twice;
+    read(once, RootOf(xml, source));
+    IXMLDOMNodePtr written = WriteBelow(once, first, write);
+    ASSERT_TRUE(written);
+    EXPECT_EQ(XmlOf(written), expected);
+    read(twice, written);
+    IXMLDOMNodePtr again = WriteBelow(twice, second, write);
+    ASSERT_TRUE(again);
+    EXPECT_EQ(XmlOf(again), expected);
+}
+
 /// Runs `action` and checks that it throws KestCalmorphDLLError with this code and text.
 template <class Action>
 void ExpectDllError(Action action, int code, const std::string& text = std::string()) {
@@ -83,6 +113,15 @@ void ExpectDllError(Action action, int code, const std::string& text = std::stri
         EXPECT_EQ(error.GetReason(), code);
         EXPECT_EQ(error.GetReasonString().ToString(), text);
     }
+}
+
+/// Reads `xml` with `read(T&, node)` and checks the library error it throws.
+template <class T, class Read>
+void ExpectReadError(const std::u16string& xml, Read read, int code, const std::string& text) {
+    IXMLDOMDocument2Ptr doc;
+    IXMLDOMNodePtr node = RootOf(xml, doc);
+    T object;
+    ExpectDllError([&] { read(object, node); }, code, text);
 }
 
 /// Runs `action` and checks that it throws _com_error with this code.
