@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <chrono>
 #include <cstring>
 #include <string>
 
@@ -27,18 +26,15 @@ struct FailAfter {
 
 }  // namespace
 
-TEST(BStr, AllocationKeepsLengthPrefixAndTerminator) {
+TEST(BStr, LengthPrefixTerminatorAndNullAsEmpty) {
     Owned text(SysAllocString(u"abc"));
     ASSERT_NE(text.text, nullptr);
     EXPECT_EQ(SysStringLen(text.text), 3u);
-    EXPECT_EQ(SysStringByteLen(text.text), 6u);
     std::uint32_t prefix;
     std::memcpy(&prefix, reinterpret_cast<char*>(text.text) - 4, 4);
     EXPECT_EQ(prefix, 6u);
     EXPECT_EQ(text.text[3], u'\0');
-}
 
-TEST(BStr, NullReadsAsEmpty) {
     EXPECT_EQ(SysAllocString(nullptr), nullptr);
     EXPECT_EQ(SysStringLen(nullptr), 0u);
     EXPECT_EQ(SysStringByteLen(nullptr), 0u);
@@ -49,17 +45,14 @@ TEST(BStr, NullReadsAsEmpty) {
 TEST(BStr, LengthAndByteLengthForms) {
     Owned embedded(SysAllocStringLen(u"a\0b", 3));
     EXPECT_EQ(BstrView(embedded.text), std::u16string_view(u"a\0b", 3));
-
     Owned zeros(SysAllocStringLen(nullptr, 4));
     EXPECT_EQ(BstrView(zeros.text), std::u16string(4, u'\0'));
-
     Owned odd(SysAllocStringByteLen("xyz", 3));
     EXPECT_EQ(SysStringByteLen(odd.text), 3u);
     EXPECT_EQ(SysStringLen(odd.text), 1u);
     // The code unit after the last whole one holds the odd byte, then a full zero follows.
     EXPECT_EQ(reinterpret_cast<const char*>(odd.text)[2], 'z');
     EXPECT_EQ(odd.text[2], u'\0');
-
     Owned empty(SysAllocStringLen(u"ignored", 0));
     ASSERT_NE(empty.text, nullptr);
     EXPECT_EQ(SysStringLen(empty.text), 0u);
@@ -78,21 +71,15 @@ TEST(BStr, AllocationFailureGivesNull) {
     // A length whose byte count does not fit the prefix is refused without allocating.
     EXPECT_EQ(SysAllocStringLen(nullptr, 0x80000000u), nullptr);
     EXPECT_EQ(SysAllocStringByteLen(nullptr, 0xFFFFFFFFu), nullptr);
-    {
-        FailAfter fail(0);
-        EXPECT_EQ(SysAllocString(u"x"), nullptr);
-    }
+    BSTR text = SysAllocString(u"keep");
     {
         FailAfter fail(1);
         Owned first(SysAllocString(u"x"));
         EXPECT_NE(first.text, nullptr);
         EXPECT_EQ(SysAllocStringFromUtf8("y"), nullptr);
-        Owned third(SysAllocString(u"z"));
+        Owned third(SysAllocString(u"z"));  // only the one allocation fails
         EXPECT_NE(third.text, nullptr);
-    }
-    BSTR text = SysAllocString(u"keep");
-    {
-        FailAfter fail(0);
+        SysFailAllocationAfter(0);
         EXPECT_FALSE(SysReAllocString(&text, u"other"));
     }
     EXPECT_EQ(BstrView(text), u"keep");
@@ -100,28 +87,12 @@ TEST(BStr, AllocationFailureGivesNull) {
 }
 
 TEST(BStr, VarBstrCmpIsOrdinalAndNullEqualsEmpty) {
-    Owned empty(SysAllocString(u""));
-    Owned a(SysAllocString(u"a"));
-    Owned upperA(SysAllocString(u"A"));
-    Owned ab(SysAllocString(u"ab"));
-    Owned numeric(SysAllocString(u"NUMERIC"));
-    Owned numeric2(SysAllocString(u"NUMERIC"));
-    Owned lower(SysAllocString(u"numeric"));
-    Owned embedded(SysAllocStringLen(u"a\0b", 3));
-    struct Row {
-        const char* label;
-        BSTR left, right;
-        HRESULT expected;
-    } rows[] = {
-        {"null null", nullptr, nullptr, VARCMP_EQ},
-        {"null empty", nullptr, empty.text, VARCMP_EQ},
-        {"empty null", empty.text, nullptr, VARCMP_EQ},
-        {"null a", nullptr, a.text, VARCMP_LT},
-        {"a null", a.text, nullptr, VARCMP_GT},
-        {"same text", numeric.text, numeric2.text, VARCMP_EQ},
-        {"case differs", numeric.text, lower.text, VARCMP_LT},
-        {"A a ordinal", upperA.text, a.text, VARCMP_LT},
-        {"prefix", a.text, ab.text, VARCMP_LT},
+    Owned empty(SysAllocString(u"")), a(SysAllocString(u"a")), upperA(SysAllocString(u"A"));
+    Owned ab(SysAllocString(u"ab")), embedded(SysAllocStringLen(u"a\0b", 3));
+    struct Row { const char* label; BSTR left, right; HRESULT expected; } rows[] = {
+        {"null null", nullptr, nullptr, VARCMP_EQ}, {"null empty", nullptr, empty.text, VARCMP_EQ},
+        {"null a", nullptr, a.text, VARCMP_LT}, {"a null", a.text, nullptr, VARCMP_GT},
+        {"A a ordinal", upperA.text, a.text, VARCMP_LT}, {"prefix", a.text, ab.text, VARCMP_LT},
         {"embedded zero counts", embedded.text, a.text, VARCMP_GT},
     };
     for (const Row& row : rows) {
@@ -131,39 +102,25 @@ TEST(BStr, VarBstrCmpIsOrdinalAndNullEqualsEmpty) {
 }
 
 TEST(BStr, Utf8ToUtf16ReplacesEachMaximalIllFormedSubpart) {
-    struct Row {
-        const char* label;
-        std::string utf8;
-        std::u16string utf16;
-    } rows[] = {
-        {"ascii", "plain ASCII text, long enough for the fast path", 
-         u"plain ASCII text, long enough for the fast path"},
-        {"two byte", "\xC3\xA9", u"\u00E9"},
-        {"three byte", "\xE2\x82\xAC", u"\u20AC"},
+    struct Row { const char* label; std::string utf8; std::u16string utf16; } rows[] = {
+        {"two byte after eight ascii", "12345678\xC3\xA9", u"12345678\u00E9"},
         {"four byte", "\xF0\x9F\x98\x80", u"\U0001F600"},
         {"largest", "\xF4\x8F\xBF\xBF", u"\U0010FFFF"},
         {"embedded zero", std::string("a\0b", 3), std::u16string(u"a\0b", 3)},
-        {"stray continuation", "a\x80z", u"a\uFFFDz"},
-        {"two stray continuations", "\x80\xBF", u"\uFFFD\uFFFD"},
+        {"stray continuations", "a\x80\xBFz", u"a\uFFFD\uFFFDz"},
         {"overlong lead C0", "\xC0\xAF", u"\uFFFD\uFFFD"},
-        {"overlong lead C1", "\xC1\xBF", u"\uFFFD\uFFFD"},
         {"overlong three byte", "\xE0\x80\xAF", u"\uFFFD\uFFFD\uFFFD"},
         {"overlong four byte", "\xF0\x8F\xBF\xBF", u"\uFFFD\uFFFD\uFFFD\uFFFD"},
         {"encoded surrogate", "\xED\xA0\x80", u"\uFFFD\uFFFD\uFFFD"},
         {"last before surrogates", "\xED\x9F\xBF", u"\uD7FF"},
         {"above U+10FFFF", "\xF4\x90\x80\x80", u"\uFFFD\uFFFD\uFFFD\uFFFD"},
-        {"lead F5", "\xF5\x80", u"\uFFFD\uFFFD"},
-        {"lead FF", "\xFF", u"\uFFFD"},
-        {"truncated two byte at end", "a\xC3", u"a\uFFFD"},
-        {"truncated three byte at end", "\xE2\x82", u"\uFFFD"},
-        {"truncated four byte at end", "\xF0\x9F\x98", u"\uFFFD"},
+        {"lead F5 and FF", "\xF5\x80\xFF", u"\uFFFD\uFFFD\uFFFD"},
+        {"truncated at end", "a\xF0\x9F\x98", u"a\uFFFD"},
         {"truncated then ascii", "\xE2\x82z", u"\uFFFDz"},
-        {"truncated four then ascii", "\xF0\x9F\x98!", u"\uFFFD!"},
         {"bad second byte keeps it", "\xC3(", u"\uFFFD("},
         {"lead then lead", "\xE2\xE2\x82\xAC", u"\uFFFD\u20AC"},
         {"Unicode example", "\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64",
          u"a\uFFFD\uFFFD\uFFFDb\uFFFDc\uFFFD\uFFFDd"},
-        {"after eight ascii", "12345678\xC3\xA9", u"12345678\u00E9"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
@@ -176,19 +133,11 @@ TEST(BStr, Utf8ToUtf16ReplacesEachMaximalIllFormedSubpart) {
 }
 
 TEST(BStr, Utf16ToUtf8ReplacesUnpairedSurrogates) {
-    struct Row {
-        const char* label;
-        std::u16string utf16;
-        std::string utf8;
-    } rows[] = {
-        {"ascii", u"abc", "abc"},
-        {"empty", u"", ""},
-        {"two byte", u"\u00E9", "\xC3\xA9"},
-        {"three byte", u"\u20AC", "\xE2\x82\xAC"},
+    struct Row { const char* label; std::u16string utf16; std::string utf8; } rows[] = {
+        {"two and three byte", u"\u00E9\u20AC", "\xC3\xA9\xE2\x82\xAC"},
         {"pair", u"\U0001F600", "\xF0\x9F\x98\x80"},
         {"lone high", u"a\xD800z", "a\xEF\xBF\xBDz"},
         {"lone high at end", u"a\xDBFF", "a\xEF\xBF\xBD"},
-        {"lone low", u"\xDC00", "\xEF\xBF\xBD"},
         {"reversed pair", u"\xDC00\xD800", "\xEF\xBF\xBD\xEF\xBF\xBD"},
         {"high then pair", u"\xD800\xD83D\xDE00", "\xEF\xBF\xBD\xF0\x9F\x98\x80"},
         {"embedded zero", std::u16string(u"a\0b", 3), std::string("a\0b", 3)},
@@ -211,23 +160,4 @@ TEST(BStr, EveryCodePointRoundTrips) {
         }
     }
     EXPECT_EQ(Utf8ToUtf16(Utf16ToUtf8(all)), all);
-}
-
-TEST(BStr, ConversionSpeed) {
-    // Large mixed text: mostly ASCII, as in calibration files, with some accented names.
-    std::string utf8;
-    for (int i = 0; utf8.size() < 32u * 1024 * 1024; ++i) {
-        utf8 += "<VALUE>1.25 2.5 3.75 4 5 6 7 8</VALUE> Kennlinie f\xC3\xBCr Drehzahl ";
-    }
-    auto start = std::chrono::steady_clock::now();
-    std::u16string wide = Utf8ToUtf16(utf8);
-    auto middle = std::chrono::steady_clock::now();
-    std::string back = Utf16ToUtf8(wide);
-    auto end = std::chrono::steady_clock::now();
-    EXPECT_EQ(back, utf8);
-    double mb = utf8.size() / (1024.0 * 1024.0);
-    double toWide = std::chrono::duration<double>(middle - start).count();
-    double toNarrow = std::chrono::duration<double>(end - middle).count();
-    std::printf("UTF-8 -> UTF-16: %.0f MB/s, UTF-16 -> UTF-8: %.0f MB/s (%.0f MB)\n",
-                mb / toWide, mb / toNarrow, mb);
 }

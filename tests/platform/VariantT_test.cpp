@@ -2,8 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <limits>
-
 #include "platform/ComError.h"
 
 using namespace kest;
@@ -35,18 +33,11 @@ _variant_t ArrayOf(std::initializer_list<_variant_t> elements) {
 }  // namespace
 
 TEST(VariantT, ConstructorsSetTheNaturalType) {
-    EXPECT_EQ(_variant_t().vt, VT_EMPTY);
     EXPECT_EQ(_variant_t(short(3)).vt, VT_I2);
-    EXPECT_EQ(_variant_t(3).vt, VT_I4);
     EXPECT_EQ(_variant_t(3L).vt, VT_I4);
     EXPECT_EQ(_variant_t(1.5f).vt, VT_R4);
-    EXPECT_EQ(_variant_t(1.5).vt, VT_R8);
-    EXPECT_EQ(_variant_t(true).vt, VT_BOOL);
     EXPECT_EQ(_variant_t(true).boolVal, VARIANT_TRUE);
-    EXPECT_EQ(_variant_t(_bstr_t("x")).vt, VT_BSTR);
     EXPECT_EQ(BstrView(_variant_t("gr\xC3\xBCn").bstrVal), u"gr\u00FCn");
-    EXPECT_EQ(BstrView(_variant_t(u"wide").bstrVal), u"wide");
-    EXPECT_EQ(BstrView(_variant_t(std::string("s")).bstrVal), u"s");
     EXPECT_EQ(BstrView(_variant_t(std::u16string(u"u")).bstrVal), u"u");
     _variant_t nullText(_bstr_t{});
     EXPECT_EQ(nullText.vt, VT_BSTR);
@@ -68,22 +59,8 @@ TEST(VariantT, AssignmentsReplaceTypeAndValue) {
     value = 7;
     EXPECT_EQ(value.vt, VT_I4);
     EXPECT_EQ(value.lVal, 7);
-    value = 2.5;
-    EXPECT_EQ(value.vt, VT_R8);
-    value = short(4);
-    EXPECT_EQ(value.vt, VT_I2);
-    value = 1.5f;
-    EXPECT_EQ(value.vt, VT_R4);
-    value = false;
-    EXPECT_EQ(value.vt, VT_BOOL);
-    value = _bstr_t(u"b");
-    EXPECT_EQ(value.vt, VT_BSTR);
-    value = u"w";
-    EXPECT_EQ(BstrView(value.bstrVal), u"w");
     value = "n";
     EXPECT_EQ(BstrView(value.bstrVal), u"n");
-    value = 9L;
-    EXPECT_EQ(value.vt, VT_I4);
 
     _variant_t array = ArrayOf({_variant_t(1), _variant_t(u"two")});
     value = array;
@@ -93,7 +70,6 @@ TEST(VariantT, AssignmentsReplaceTypeAndValue) {
     EXPECT_TRUE(value == array);
     // Assigning an element of its own array to the value itself.
     value = value.parray->pvData[1];
-    EXPECT_EQ(value.vt, VT_BSTR);
     EXPECT_EQ(BstrView(value.bstrVal), u"two");
 }
 
@@ -101,40 +77,29 @@ TEST(VariantT, CopyIsDeepAndMoveTransfers) {
     _variant_t original = ArrayOf({_variant_t(u"a"), ArrayOf({_variant_t(2.5)})});
     _variant_t copy(original);
     ASSERT_NE(copy.parray, original.parray);
-    EXPECT_TRUE(copy == original);
     _variant_t changed(u"b");
     LONG index = 0;
     ASSERT_EQ(SafeArrayPutElement(copy.parray, &index, &changed), S_OK);
-    EXPECT_FALSE(copy == original);
     EXPECT_EQ(BstrView(original.parray->pvData[0].bstrVal), u"a");
 
     SAFEARRAY* storage = original.parray;
     _variant_t moved(std::move(original));
     EXPECT_EQ(moved.parray, storage);
     EXPECT_EQ(original.vt, VT_EMPTY);
-
     VARIANT raw = moved.Detach();
     EXPECT_EQ(moved.vt, VT_EMPTY);
     _variant_t attached(raw, false);
     EXPECT_EQ(attached.parray, storage);
-    EXPECT_EQ(raw.vt, VT_EMPTY);
 }
 
 TEST(VariantT, ConversionOperatorsThrowTheFailureCode) {
-    struct Row {
-        const char* label;
-        _variant_t value;
-        HRESULT toDouble;
-        HRESULT toInt;
-        HRESULT toText;
-    } rows[] = {
+    const HRESULT mismatch = DISP_E_TYPEMISMATCH;
+    struct Row { const char* label; _variant_t value; HRESULT toDouble, toInt, toText; } rows[] = {
         {"number text", _variant_t(u" 12.5 "), S_OK, S_OK, S_OK},
-        {"word", _variant_t(u"abc"), DISP_E_TYPEMISMATCH, DISP_E_TYPEMISMATCH, S_OK},
-        {"empty text", _variant_t(u""), DISP_E_TYPEMISMATCH, DISP_E_TYPEMISMATCH, S_OK},
-        {"null text", _variant_t(_bstr_t{}), DISP_E_TYPEMISMATCH, DISP_E_TYPEMISMATCH, S_OK},
+        {"word", _variant_t(u"abc"), mismatch, mismatch, S_OK},
+        {"null text", _variant_t(_bstr_t{}), mismatch, mismatch, S_OK},
         {"huge", _variant_t(1e300), S_OK, DISP_E_OVERFLOW, S_OK},
-        {"array", ArrayOf({_variant_t(1)}), DISP_E_TYPEMISMATCH, DISP_E_TYPEMISMATCH,
-         DISP_E_TYPEMISMATCH},
+        {"array", ArrayOf({_variant_t(1)}), mismatch, mismatch, mismatch},
         {"empty", _variant_t(), S_OK, S_OK, S_OK},
     };
     for (const Row& row : rows) {
@@ -147,44 +112,28 @@ TEST(VariantT, ConversionOperatorsThrowTheFailureCode) {
     EXPECT_EQ(static_cast<double>(text), 12.5);
     EXPECT_EQ(static_cast<int>(text), 12);  // half to even
     EXPECT_EQ(static_cast<long>(_variant_t(u"13.5")), 14);
-    EXPECT_EQ(static_cast<short>(_variant_t(u"-7")), -7);
-    EXPECT_EQ(static_cast<float>(_variant_t(u"0.25")), 0.25f);
     EXPECT_TRUE(static_cast<bool>(_variant_t(u"true")));
     EXPECT_EQ(static_cast<_bstr_t>(_variant_t(2.5)).View(), u"2.5");
-    EXPECT_EQ(static_cast<_bstr_t>(_variant_t(-17)).View(), u"-17");
-    EXPECT_EQ(static_cast<_bstr_t>(_variant_t(u"same")).View(), u"same");
     EXPECT_EQ(text.vt, VT_BSTR);  // conversions leave the value alone
 }
 
 TEST(VariantT, ChangeTypeInPlaceAndFromSource) {
     _variant_t value(u"42");
     value.ChangeType(VT_I4);
-    EXPECT_EQ(value.vt, VT_I4);
     EXPECT_EQ(value.lVal, 42);
     _variant_t source(2.5);
     value.ChangeType(VT_BSTR, &source);
     EXPECT_EQ(BstrView(value.bstrVal), u"2.5");
     EXPECT_EQ(source.vt, VT_R8);
-
     _variant_t word(u"word");
     EXPECT_EQ(ThrownCode([&] { word.ChangeType(VT_R8); }), DISP_E_TYPEMISMATCH);
     EXPECT_EQ(BstrView(word.bstrVal), u"word");
-
-    VARIANT* address = word.GetAddress();
-    EXPECT_EQ(address->vt, VT_EMPTY);
-    word.Clear();
-    EXPECT_EQ(word.vt, VT_EMPTY);
+    EXPECT_EQ(word.GetAddress()->vt, VT_EMPTY);  // frees the old value for an out parameter
 }
 
 TEST(VariantT, EqualityComparesTypeAndValue) {
-    struct Row {
-        const char* label;
-        _variant_t left, right;
-        bool equal;
-    } rows[] = {
-        {"same int", _variant_t(1), _variant_t(1), true},
+    struct Row { const char* label; _variant_t left, right; bool equal; } rows[] = {
         {"int vs double", _variant_t(1), _variant_t(1.0), false},
-        {"texts", _variant_t(u"a"), _variant_t("a"), true},
         {"null text vs empty", _variant_t(_bstr_t{}), _variant_t(u""), true},
         {"case", _variant_t(u"a"), _variant_t(u"A"), false},
         {"arrays", ArrayOf({_variant_t(1), _variant_t(u"x")}),
@@ -192,7 +141,6 @@ TEST(VariantT, EqualityComparesTypeAndValue) {
         {"array lengths", ArrayOf({_variant_t(1)}), ArrayOf({_variant_t(1), _variant_t(1)}),
          false},
         {"array elements", ArrayOf({_variant_t(1)}), ArrayOf({_variant_t(2)}), false},
-        {"empties", _variant_t(), _variant_t(), true},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);

@@ -7,20 +7,11 @@
 using namespace kest;
 
 TEST(KestCdfNormalizedString, AssignmentFromBstrReplacesWithoutCollapsing) {
-    struct Row {
-        const char* label;
-        std::u16string input;
-        std::u16string expected;
-    } rows[] = {
-        {"tab", u"A\tB", u"A B"},
-        {"line feed", u"A\nB", u"A B"},
-        {"carriage return", u"A\rB", u"A B"},
+    struct Row { const char* label; std::u16string input; std::u16string expected; } rows[] = {
+        {"tab, line feed, carriage return", u"A\tB\nC\rD", u"A B C D"},
         {"CR LF gives two spaces", u"A\r\nB", u"A  B"},
-        {"runs survive", u"  two  words  ", u"  two  words  "},
-        {"mixed at both ends", u"\t\nx\r\t", u"  x  "},
-        {"only controls", u"\n\n\n", u"   "},
+        {"runs and ends survive", u"\t\nx  y\r\t", u"  x  y  "},
         {"other controls stay", u"a\vb\fc\u0085d\u2028e", u"a\vb\fc\u0085d\u2028e"},
-        {"non-ASCII with tab", u"\u00C4\t\U0001F600", u"\u00C4 \U0001F600"},
         {"embedded zero kept", std::u16string(u"a\0\tb", 4), std::u16string(u"a\0 b", 4)},
         {"empty", u"", u""},
     };
@@ -31,15 +22,10 @@ TEST(KestCdfNormalizedString, AssignmentFromBstrReplacesWithoutCollapsing) {
         EXPECT_EQ(value.m_string.View(), row.expected);
         EXPECT_NE(value.m_string.m_str, nullptr);
     }
-}
-
-TEST(KestCdfNormalizedString, NullBstrGivesEmptyValue) {
     KestCdfNormalizedString value(CComBSTR(u"old"));
     value = _bstr_t();
     EXPECT_EQ(value.m_string.m_str, nullptr);
     EXPECT_EQ(value.ToString(), "");
-    EXPECT_EQ(KestCdfNormalizedString(_bstr_t()).m_string.m_str, nullptr);
-    EXPECT_EQ(KestCdfNormalizedString().m_string.m_str, nullptr);
 }
 
 TEST(KestCdfNormalizedString, ConstructionAndCopiesKeepTextVerbatim) {
@@ -47,29 +33,20 @@ TEST(KestCdfNormalizedString, ConstructionAndCopiesKeepTextVerbatim) {
     EXPECT_EQ(fromBstrT.m_string.View(), u"A\tB\r\n");
     KestCdfNormalizedString fromCComBSTR(CComBSTR(u"C\nD"));
     EXPECT_EQ(fromCComBSTR.m_string.View(), u"C\nD");
+    EXPECT_EQ(KestCdfNormalizedString(_bstr_t()).m_string.m_str, nullptr);
 
-    KestCdfNormalizedString copy(fromBstrT);
-    EXPECT_EQ(copy.m_string.View(), u"A\tB\r\n");
+    KestCdfNormalizedString copy(fromBstrT), assigned;
     EXPECT_NE(copy.m_string.m_str, fromBstrT.m_string.m_str);
-
-    KestCdfNormalizedString assigned;
     assigned = fromCComBSTR;
     EXPECT_EQ(assigned.m_string.View(), u"C\nD");
     EXPECT_NE(assigned.m_string.m_str, fromCComBSTR.m_string.m_str);
-    assigned = KestCdfNormalizedString();
-    EXPECT_EQ(assigned.m_string.m_str, nullptr);
-
     // Self-assignment must not free the text it is about to copy.
-    BSTR before = copy.m_string.m_str;
     copy = copy;
-    EXPECT_EQ(copy.m_string.m_str, before);
-    EXPECT_EQ(copy.m_string.View(), u"A\tB\r\n");
     EXPECT_EQ(copy.ToU16String(), u"A\tB\r\n");
 }
 
 TEST(KestCdfNormalizedString, CopyAssignmentOutOfMemoryLeavesEmpty) {
-    KestCdfNormalizedString source(CComBSTR(u"source"));
-    KestCdfNormalizedString target(CComBSTR(u"target"));
+    KestCdfNormalizedString source(CComBSTR(u"source")), target(CComBSTR(u"target"));
     SysFailAllocationAfter(0);
     EXPECT_THROW(target = source, CAtlException);
     SysFailAllocationAfter(-1);
