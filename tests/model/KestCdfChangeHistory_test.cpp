@@ -48,11 +48,13 @@ TEST(KestCdfChangeHistory, RoundTripsThroughReadWriteRead) {
 TEST(KestCdfChangeHistory, BadEntryKeepsWhatWasReadAndDoesNotStopTheOthers) {
     IXMLDOMDocument2Ptr doc;
     KestCdfChangeHistory history;
-    Read(history, test::RootOf(
-        u"<CHANGE-HISTORY><CHANGE><USERNAME>a</USERNAME><DATE>2020-13-01T00:00:00</DATE>"
-        u"<TOOL>t</TOOL></CHANGE><CHANGE><USERNAME>b</USERNAME><DATE>2020-02-02T00:00:00</DATE>"
-        u"<TOOL>u</TOOL></CHANGE></CHANGE-HISTORY>",
-        doc));
+    Read(
+        history,
+        test::RootOf(
+            u"<CHANGE-HISTORY><CHANGE><USERNAME>a</USERNAME><DATE>2020-13-01T00:00:00</DATE>"
+            u"<TOOL>t</TOOL></CHANGE><CHANGE><USERNAME>b</USERNAME><DATE>2020-02-02T00:00:00</DATE>"
+            u"<TOOL>u</TOOL></CHANGE></CHANGE-HISTORY>",
+            doc));
     ASSERT_EQ(history.GetChangeArraySize(), 2);
     const KestCdfChange* changes = history.GetChange();
     EXPECT_EQ(Utf8(changes[0].GetUserNameW()), "a");

@@ -59,8 +59,10 @@ TEST(KestCdfChange, FailureInsideOneChildEndsTheEntryQuietly) {
         const char16_t* xml;
         const char* user;
     } rows[] = {
-        {"month 13", u"<CHANGE><USERNAME>u</USERNAME><DATE>2024-13-01T00:00:00</DATE><TOOL>t</TOOL>"
-                     u"</CHANGE>", "u"},
+        {"month 13",
+         u"<CHANGE><USERNAME>u</USERNAME><DATE>2024-13-01T00:00:00</DATE><TOOL>t</TOOL>"
+         u"</CHANGE>",
+         "u"},
         {"short date", u"<CHANGE><DATE>2024-01-01</DATE><USERNAME>u</USERNAME></CHANGE>", ""},
         {"element first in the user name",
          u"<CHANGE><USERNAME><b/></USERNAME><TOOL>t</TOOL></CHANGE>", ""},

@@ -18,11 +18,22 @@ TEST(KestCdfSymbolicFile, AtohdReadsHexadecimalOnlyWithLowercaseX) {
         const char* text;
         int expected;
     } rows[] = {
-        {"0xFFFFFFFF", -1}, {"0x80000000", INT_MIN}, {"0x1a", 26}, {"\t\n0x10", 16},
+        {"0xFFFFFFFF", -1},
+        {"0x80000000", INT_MIN},
+        {"0x1a", 26},
+        {"\t\n0x10", 16},
         {"ffx", 255},  // an 'x' anywhere selects hexadecimal
-        {"0xg", 0}, {"-0x1", -1}, {"0x100000000", -1}, {"255", 255}, {"12AB", 12},
+        {"0xg", 0},
+        {"-0x1", -1},
+        {"0x100000000", -1},
+        {"255", 255},
+        {"12AB", 12},
         {"0X1A", 0},  // capital X alone reads as decimal
-        {"  -42", -42}, {"", 0}, {"2147483648", INT_MAX}, {"-2147483649", INT_MIN}, {nullptr, 0},
+        {"  -42", -42},
+        {"", 0},
+        {"2147483648", INT_MAX},
+        {"-2147483649", INT_MIN},
+        {nullptr, 0},
     };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.text ? row.text : "(null)");
@@ -65,7 +76,8 @@ TEST(KestCdfSymbolicFile, RoundTripsThroughReadWriteRead) {
     for (const auto& row : rows) {
         SCOPED_TRACE(row.label);
         test::ExpectRoundTrip<KestCdfSymbolicFile>(
-            row.xml, row.written, [](auto& f, auto node) { EXPECT_TRUE(f.ConvertSymbolicFileNode(node)); },
+            row.xml, row.written,
+            [](auto& f, auto node) { EXPECT_TRUE(f.ConvertSymbolicFileNode(node)); },
             [](auto& f, auto parent, auto& doc) {
                 EXPECT_TRUE(f.ConvertSymbolicFileNodeToXML(parent, doc.GetInterfacePtr(), Ns(u"")));
             });
@@ -88,14 +100,16 @@ TEST(KestCdfSymbolicFile, MalformedInputFailsWithItsReason) {
     EXPECT_EQ(file.GetNodeString(root->Getattributes()->nextNode()).ToString(), "0x1a\tz");
 
     // An element nested in the file name has no text.
-    IXMLDOMNodePtr nested = test::RootOf(u"<SYMBOLIC-FILE crc32=\"0x1\">a<b/></SYMBOLIC-FILE>", doc);
+    IXMLDOMNodePtr nested =
+        test::RootOf(u"<SYMBOLIC-FILE crc32=\"0x1\">a<b/></SYMBOLIC-FILE>", doc);
     ExpectComError([&] { file.ConvertSymbolicFileNode(nested); }, DISP_E_TYPEMISMATCH);
     ExpectComError([&] { file.ConvertSymbolicFileNode(IXMLDOMNodePtr()); }, E_POINTER);
 
     doc = test::NewDocument();
     IXMLDOMNodePtr parent = doc->createElement(_bstr_t(u"P"));
-    ExpectComError([&] { file.ConvertSymbolicFileNodeToXML(nullptr, doc.GetInterfacePtr(), Ns(u"")); },
-                   E_POINTER);
+    ExpectComError(
+        [&] { file.ConvertSymbolicFileNodeToXML(nullptr, doc.GetInterfacePtr(), Ns(u"")); },
+        E_POINTER);
     ExpectComError([&] { file.ConvertSymbolicFileNodeToXML(parent, nullptr, Ns(u"")); }, E_POINTER);
     EXPECT_FALSE(parent->hasChildNodes());
 }

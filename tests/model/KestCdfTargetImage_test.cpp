@@ -35,7 +35,8 @@ TEST(KestCdfTargetImage, AccessorsDifferFromTheSymbolicFileOnlyWhereDocumented) 
     IXMLDOMDocument2Ptr doc;
     KestCdfTargetImage image;
     image.SetCrc(99);
-    EXPECT_TRUE(image.ConvertTargetImageFileNode(test::RootOf(u"<TARGET-IMAGE>b</TARGET-IMAGE>", doc)));
+    EXPECT_TRUE(
+        image.ConvertTargetImageFileNode(test::RootOf(u"<TARGET-IMAGE>b</TARGET-IMAGE>", doc)));
     EXPECT_EQ(image.GetCrc(), 0);  // no attribute reads as CRC 0
     EXPECT_EQ(test::Utf8(image.GetTargetImage()), "b");
 
