@@ -142,6 +142,40 @@ VARIANT_BOOL FailLoad(DomDocument& doc, DomError error) {
     return VARIANT_FALSE;
 }
 
+bool StatFile(const std::string& path, long long& size, long long& mtimeNs) {
+    struct stat info;
+    if (::stat(path.c_str(), &info) != 0) return false;
+    size = static_cast<long long>(info.st_size);
+    mtimeNs = static_cast<long long>(info.st_mtim.tv_sec) * 1000000000LL + info.st_mtim.tv_nsec;
+    return true;
+}
+
+void RememberLoadedFile(DomDocument& doc, const std::string& path) {
+    DomDocument::LoadedFile& loaded = doc.loadedFile;
+    loaded = DomDocument::LoadedFile();
+    if (!StatFile(path, loaded.size, loaded.mtimeNs)) return;
+    loaded.path = path;
+    loaded.generation = doc.generation;
+    loaded.textChanges = doc.textChanges;
+}
+
+// The bytes of the file the document was loaded from, when neither the document nor the file
+// has changed since; validating those keeps the file's own line numbers in the reasons.
+bool ReadUnchangedSource(const DomDocument& doc, std::string& bytes) {
+    const DomDocument::LoadedFile& loaded = doc.loadedFile;
+    if (loaded.path.empty() || loaded.generation != doc.generation ||
+        loaded.textChanges != doc.textChanges)
+        return false;
+    long long size = -1, mtimeNs = -1;
+    if (!StatFile(loaded.path, size, mtimeNs) || size != loaded.size || mtimeNs != loaded.mtimeNs)
+        return false;
+    std::ifstream in(loaded.path, std::ios::binary);
+    if (!in) return false;
+    bytes.assign(static_cast<std::size_t>(size), '\0');
+    in.read(&bytes[0], static_cast<std::streamsize>(size));
+    return in.gcount() == static_cast<std::streamsize>(size);
+}
+
 // Loads a file. The file is not held in memory while the tree is built: when the root names
 // schemas (and validate-on-parse is on) the file is read whole and validated first, then freed
 // and parsed again piece by piece, so the peak is the larger of the two phases, not their sum.
@@ -189,6 +223,7 @@ VARIANT_BOOL LoadFile(DomDocument& doc, const std::string& path, const std::stri
     doc.url = url;
     doc.error = DomError();
     doc.error.url = url;
+    RememberLoadedFile(doc, path);
     return VARIANT_TRUE;
 }
 
@@ -534,7 +569,10 @@ IXMLDOMParseErrorPtr IXMLDOMDocument2::validate() {
         return detail::MakeParseError(doc.error);
     }
     std::string bytes;
-    detail::WriteXml(&doc.node, bytes);
+    if (!ReadUnchangedSource(doc, bytes)) {
+        bytes.clear();
+        detail::WriteXml(&doc.node, bytes);
+    }
     detail::ValidationOutcome outcome;
     if (doc.schemas) {
         outcome = detail::ValidateAgainstCollection(bytes, doc.url, *doc.schemas);

@@ -149,6 +149,7 @@ void DomDocument::Clear() {
     node.SetFirstChild(nullptr);
     node.SetLastChild(nullptr);
     ++generation;
+    loadedFile = LoadedFile();
     if (refs == 1) {
         // Only the caller's document pointer is left: no node of the old content is reachable.
         stores.clear();

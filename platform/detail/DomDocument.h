@@ -170,6 +170,17 @@ struct DomDocument {
     ComPtr<IXMLDOMSchemaCollection> schemas;
     DomError error;
     std::string url;  // where the current content was loaded from
+    /// Bumped by every change of a node's text.
+    std::uint64_t textChanges = 0;
+    /// The file the content came from and how it stood then, so validate() can check the file's
+    /// own bytes (and report the file's line numbers) while nothing has changed since.
+    struct LoadedFile {
+        std::string path;
+        std::uint64_t generation = 0;
+        std::uint64_t textChanges = 0;
+        long long size = -1;
+        long long mtimeNs = -1;
+    } loadedFile;
 
     /// The node and document behind an interface handle (null for null).
     static DomNode* NodeOf(const IXMLDOMNode* handle) noexcept {
@@ -189,7 +200,10 @@ struct DomDocument {
     DomNode* NewNode(DOMNodeType type, const DomName* name = nullptr) {
         return Store().NewNode(type, name);
     }
-    void SetText(DomNode* n, std::string_view text) { Store().SetText(n, text); }
+    void SetText(DomNode* n, std::string_view text) {
+        ++textChanges;
+        Store().SetText(n, text);
+    }
     /// Drops the current content. Detached nodes stay readable while referenced; when nothing
     /// but one document pointer refers to the document, their memory is returned.
     void Clear();

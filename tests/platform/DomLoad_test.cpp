@@ -414,3 +414,26 @@ TEST(DomLoad, ValidateUsesAttachedSchemasOrThoseTheRootNames) {
     named->GetdocumentElement()->GetlastChild()->GetfirstChild()->PutnodeValue(_variant_t("3"));
     EXPECT_EQ(named->validate()->GeterrorCode(), 0);
 }
+
+TEST(DomLoad, ValidateOfAnUnchangedFileReportsTheFilesOwnLines) {
+    // The element out of order stands on line 6 of the indented file; a re-serialised copy
+    // would put it on another line.
+    const std::string data = std::string(KEST_TEST_DATA_DIR) + "/schema/wrong-order.cdf";
+    const std::string schema = std::string(KEST_SOURCE_DIR) + "/schema/cdf.xsd";
+    IXMLDOMSchemaCollectionPtr cache;
+    ASSERT_EQ(cache.CreateInstance(kProgIdXMLSchemaCache40), S_OK);
+    cache->add(u"http://kest.dev/schemas/cdf/1.0", _variant_t(schema));
+    IXMLDOMDocument2Ptr doc;
+    ASSERT_EQ(doc.CreateInstance(kProgIdDOMDocument40), S_OK);
+    doc->PutvalidateOnParse(VARIANT_FALSE);
+    ASSERT_EQ(doc->load(_variant_t(data)), VARIANT_TRUE);
+    doc->putref_schemas(cache);
+    IXMLDOMParseErrorPtr result = doc->validate();
+    EXPECT_EQ(result->Getline(), 6) << result->Getreason().ToString();
+
+    // Once the document changes, its current content is what gets validated.
+    doc->GetdocumentElement()->appendChild(doc->createComment(_bstr_t("edited")));
+    result = doc->validate();
+    EXPECT_NE(result->GeterrorCode(), 0);
+    EXPECT_NE(result->Getline(), 6);
+}
