@@ -37,7 +37,8 @@ bool BoundsFit(LONG lowerBound, ULONG count) noexcept {
 }
 
 bool ResizeStorage(ArrayBlock* block, ULONG capacity) noexcept {
-    if (capacity > std::numeric_limits<std::size_t>::max() / sizeof(VARIANT)) return false;
+    // On 64-bit targets a 32-bit count times 16 bytes cannot overflow size_t.
+    static_assert(sizeof(std::size_t) >= 8, "element storage size is computed in size_t");
     std::size_t bytes = static_cast<std::size_t>(capacity) * sizeof(VARIANT);
     void* data = std::realloc(block->descriptor.pvData, bytes ? bytes : 1);
     if (!data) return false;
