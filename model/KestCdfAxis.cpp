@@ -155,7 +155,7 @@ unsigned int KestCdfAxis::GetNodeValue(IXMLDOMNodePtr node) {
 _bstr_t KestCdfAxis::GetNodeString(IXMLDOMNodePtr node) {
     if (!node || node->GetnodeType() != NODE_ATTRIBUTE)
         KestCalmorphDLLError::Raise(reason::kAxisAttributeMissing);
-    return static_cast<_bstr_t>(node->GetnodeValue());
+    return detail::TakeText(node->GetnodeValue());
 }
 
 bool KestCdfAxis::ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,

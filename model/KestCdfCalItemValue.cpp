@@ -116,12 +116,10 @@ void KestCdfCalItemValue::SetCalItemValueAttributes(IXMLDOMNamedNodeMapPtr attri
 }
 
 _bstr_t KestCdfCalItemValue::GetNodeString(IXMLDOMNodePtr node) {
-    _bstr_t result("Error occured");
-    if (!node) return result;
+    if (!node) return _bstr_t(u"Error occured");
     if (node->GetnodeType() != NODE_ATTRIBUTE)
         KestCalmorphDLLError::Raise(reason::kValueNotAttribute);
-    result = static_cast<_bstr_t>(node->GetnodeValue());
-    return result;
+    return detail::TakeText(node->GetnodeValue());
 }
 
 bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent,

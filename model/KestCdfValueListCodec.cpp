@@ -1,9 +1,14 @@
 #include "KestCdfValueListCodec.h"
 
+#include <algorithm>
+#include <cfloat>
 #include <charconv>
 #include <climits>
 #include <cmath>
+#include <cstdint>
 #include <cstring>
+#include <memory>
+#include <new>
 #include <locale.h>
 #include <stdlib.h>
 #include <string>
@@ -26,13 +31,15 @@ inline bool IsDigit(char c) noexcept { return c >= '0' && c <= '9'; }
 
 inline char LowerAscii(char c) noexcept { return static_cast<char>(c | 0x20); }
 
-// Texts are parsed as narrow characters. Every UTF-16 unit becomes exactly one byte so that
-// positions match the text; a unit outside ASCII can never be part of a number, so one
-// placeholder byte that is neither white space, digit, sign nor letter stands in for all.
-void Narrow(std::u16string_view text, std::string& out) {
-    out.resize(text.size());
-    char* p = out.data();
-    for (char16_t c : text) *p++ = c < 0x80 ? static_cast<char>(c) : '\x7f';
+// Tokens are parsed as narrow characters, one byte per UTF-16 unit so that positions match
+// the text. A unit outside ASCII can never be part of a number, so one placeholder byte that is
+// neither white space, digit, sign nor letter stands in for all: the narrowing is
+// min(unit, 0x7f), which compilers turn into a few vector instructions.
+void Narrow(std::u16string_view text, char* out) noexcept {
+    const char16_t* in = text.data();
+    const std::size_t length = text.size();
+    for (std::size_t i = 0; i < length; ++i)
+        out[i] = static_cast<char>(std::min<char16_t>(in[i], u'\x7f'));
 }
 
 // The rare forms (hexadecimal, infinities, NaNs, results out of range) go to the C library's
@@ -78,30 +85,88 @@ private:
     VARIANT* m_data = nullptr;
 };
 
-void AppendAscii(std::u16string& out, const char* first, const char* last) {
-    while (first != last) out.push_back(static_cast<char16_t>(*first++));
-}
+// Collects a value text: in the object itself while it is short, which most values are, so
+// that writing a file does not allocate per value; on the heap, growing geometrically, beyond.
+class TextBuilder {
+public:
+    TextBuilder() noexcept = default;
+    TextBuilder(const TextBuilder&) = delete;
+    TextBuilder& operator=(const TextBuilder&) = delete;
 
-void AppendInt(std::u16string& out, long long value) {
+    // Room for `extra` more units at the end; throws _com_error(E_OUTOFMEMORY).
+    char16_t* Reserve(std::size_t extra) {
+        if (static_cast<std::size_t>(m_limit - m_end) < extra) Grow(extra);
+        return m_end;
+    }
+
+    void Push(char16_t c) {
+        char16_t* p = Reserve(1);
+        *p = c;
+        m_end = p + 1;
+    }
+    void Append(std::u16string_view text) {
+        char16_t* p = Reserve(text.size());
+        if (!text.empty()) std::memcpy(p, text.data(), text.size() * sizeof(char16_t));
+        m_end = p + text.size();
+    }
+    void AppendAscii(const char* first, const char* last) {
+        char16_t* p = Reserve(static_cast<std::size_t>(last - first));
+        while (first != last) *p++ = static_cast<char16_t>(*first++);
+        m_end = p;
+    }
+
+    const char16_t* data() const noexcept { return m_begin; }
+    std::size_t size() const noexcept { return static_cast<std::size_t>(m_end - m_begin); }
+
+private:
+    void Grow(std::size_t extra) {
+        const std::size_t used = size();
+        const std::size_t capacity =
+            std::max(2 * static_cast<std::size_t>(m_limit - m_begin), used + extra);
+        char16_t* grown = new (std::nothrow) char16_t[capacity];
+        if (!grown) throw _com_error(E_OUTOFMEMORY);
+        std::memcpy(grown, m_begin, used * sizeof(char16_t));
+        m_heap.reset(grown);
+        m_begin = grown;
+        m_end = grown + used;
+        m_limit = grown + capacity;
+    }
+
+    static constexpr std::size_t kLocalUnits = 2048;
+    char16_t m_local[kLocalUnits];
+    std::unique_ptr<char16_t[]> m_heap;
+    char16_t* m_begin = m_local;
+    char16_t* m_end = m_local;
+    char16_t* m_limit = m_local + kLocalUnits;
+};
+
+void AppendInt(TextBuilder& out, long long value) {
     char buffer[24];
     auto result = std::to_chars(buffer, buffer + sizeof buffer, value);
-    AppendAscii(out, buffer, result.ptr);
+    out.AppendAscii(buffer, result.ptr);
 }
 
-void AppendDouble(std::u16string& out, double value) {
+void AppendDouble(TextBuilder& out, double value) {
     char buffer[kDoubleTextCapacity];
-    AppendAscii(out, buffer, FormatDouble(value, buffer));
+    out.AppendAscii(buffer, FormatDouble(value, buffer));
 }
 
 // The platform's text of a value; the empty text when it has none.
-void AppendPlatformText(std::u16string& out, const VARIANT& value) {
+void AppendPlatformText(TextBuilder& out, const VARIANT& value) {
     VARIANT text;
     VariantInit(&text);
-    if (SUCCEEDED(VariantChangeType(&text, &value, 0, VT_BSTR))) out.append(BstrView(text.bstrVal));
+    if (SUCCEEDED(VariantChangeType(&text, &value, 0, VT_BSTR))) {
+        try {
+            out.Append(BstrView(text.bstrVal));
+        } catch (...) {
+            VariantClear(&text);
+            throw;
+        }
+    }
     VariantClear(&text);
 }
 
-void AppendElement(std::u16string& out, const VARIANT& element, ElementWriting writing,
+void AppendElement(TextBuilder& out, const VARIANT& element, ElementWriting writing,
                    bool quoteStrings) {
     switch (element.vt) {
     case VT_BSTR: {
@@ -109,9 +174,9 @@ void AppendElement(std::u16string& out, const VARIANT& element, ElementWriting w
         // A string that holds a quote cannot be quoted faithfully (there is no escape); it is
         // written as it stands, which also keeps a host's pre-quoted text unchanged.
         const bool quote = quoteStrings && text.find(u'"') == std::u16string_view::npos;
-        if (quote) out.push_back(u'"');
-        out.append(text);
-        if (quote) out.push_back(u'"');
+        if (quote) out.Push(u'"');
+        out.Append(text);
+        if (quote) out.Push(u'"');
         return;
     }
     case VT_R8:
@@ -157,17 +222,22 @@ ValueText::ValueText(const VARIANT& value) {
     m_view = m_converted.View();
 }
 
+_bstr_t TakeText(_variant_t value) {
+    if (value.vt != VT_BSTR) return static_cast<_bstr_t>(value);
+    const VARIANT raw = value.Detach();
+    return _bstr_t(raw.bstrVal, false);
+}
+
 bool IsFormatType(const KestCdfNormalizedString& formatType, std::u16string_view keyword) noexcept {
     return BstrView(formatType.m_string.m_str) == keyword;
 }
 
 int CountValues(bool numeric, std::u16string_view text) noexcept {
     if (!numeric) return 0;
-    long long spaces = 0;
-    for (char16_t c : text)
-        if (c == u' ') ++spaces;
+    std::size_t spaces = 0;
+    for (char16_t c : text) spaces += c == u' ';  // branch-free, so that it vectorises
     // A BSTR is at most 2^31 units long, but keep the count in range whatever the view.
-    return spaces >= INT_MAX ? INT_MAX : static_cast<int>(spaces + 1);
+    return spaces >= static_cast<std::size_t>(INT_MAX) ? INT_MAX : static_cast<int>(spaces + 1);
 }
 
 _variant_t NewValueArray(ULONG count) {
@@ -191,11 +261,19 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
     const ULONG count = array.parray->rgsabound[0].cElements;
     if (count == 0) return;
 
-    // One narrow copy per text, reused across calls: tokens are parsed in place.
-    thread_local std::string narrow;
+    // The whole text is narrowed in one pass (on the stack unless it is long) and the tokens
+    // are parsed in place.
+    const std::size_t length = text.size();
+    char local[2048];
+    std::unique_ptr<char[]> large;
+    char* narrow = local;
+    if (length > sizeof local) {
+        large.reset(new (std::nothrow) char[length]);
+        if (!large) throw _com_error(E_OUTOFMEMORY);
+        narrow = large.get();
+    }
     Narrow(text, narrow);
-    const char* const base = narrow.data();
-    const std::size_t length = narrow.size();
+    const char* const base = narrow;
 
     ArrayData data(array.parray);
     VARIANT* const elements = data.get();
@@ -204,7 +282,6 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
 
     ULONG k = 0;
     auto store = [&](std::size_t begin, std::size_t end) {
-        if (k >= count) return;
         VARIANT& element = elements[k];
         if (element.vt != VT_EMPTY) VariantClear(&element);
         bool asDouble = wholeTextDouble;
@@ -223,6 +300,7 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
     // Every space separates except one in the first position, which stays leading white space
     // of the first token. Without that exception a text starting with a space would yield one
     // token more than CountValues allocates; with it, the last element stays VT_EMPTY.
+    // Tokens beyond the array's size are not parsed.
     std::size_t start = 0;
     std::size_t i = 1;
     while (i < length) {
@@ -230,12 +308,11 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
         if (!space) break;
         const std::size_t at = static_cast<std::size_t>(static_cast<const char*>(space) - base);
         store(start, at);
+        if (k >= count) return;
         start = at + 1;
         i = at + 1;
     }
     store(start, length);
-    // Keep the buffer for the next text unless one huge text made it grow.
-    if (narrow.capacity() > (std::size_t(1) << 22)) std::string().swap(narrow);
 }
 
 bool IsQuoted(std::u16string_view text) noexcept {
@@ -278,24 +355,21 @@ void PutQuotedStrings(std::u16string_view text, VARIANT& array) {
 }
 
 _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings) {
-    // One growing buffer per thread, so that writing many values does not allocate per value.
-    thread_local std::u16string out;
-    out.clear();
+    TextBuilder out;
     if (stored.vt == kArrayOfVariants && stored.parray) {
         SAFEARRAY* array = stored.parray;
         const long long n = array->rgsabound[0].cElements;
         const long long lowerBound = array->rgsabound[0].lLbound;
         ArrayData data(array);
-        out.reserve(static_cast<std::size_t>(n) * 8);
         for (long long i = 0; i < n; ++i) {
             // Index i is fetched as an element index; one outside the bounds adds nothing.
             if (i < lowerBound || i - lowerBound >= n) continue;
             AppendElement(out, data.get()[i - lowerBound], writing, quoteStrings);
-            if (i < n - 1) out.push_back(u' ');
+            if (i < n - 1) out.Push(u' ');
         }
     }
+    if (out.size() > UINT_MAX / sizeof(OLECHAR)) throw _com_error(E_OUTOFMEMORY);
     BSTR text = SysAllocStringLen(out.data(), static_cast<UINT>(out.size()));
-    if (out.capacity() > (std::size_t(1) << 22)) std::u16string().swap(out);
     if (!text) throw _com_error(E_OUTOFMEMORY);
     _variant_t result;
     result.vt = VT_BSTR;
@@ -349,20 +423,10 @@ double ParseDouble(const char* first, const char* last) noexcept {
     return 0.0;
 }
 
-char* FormatDouble(double value, char* buffer) noexcept {
-    char* end;
-    const bool negativeZero = value == 0.0 && std::signbit(value);
-    if (std::fabs(value) < 1e15 && value == std::trunc(value) && !negativeZero) {
-        // Whole numbers below 10^15 (axis points, counts) are written by "%.15g" as the plain
-        // integer; the integer conversion is much cheaper than a fixed precision.
-        end = std::to_chars(buffer, buffer + kDoubleTextCapacity, static_cast<long long>(value))
-                  .ptr;
-    } else {
-        end = std::to_chars(buffer, buffer + kDoubleTextCapacity, value,
-                            std::chars_format::general, 15)
-                  .ptr;
-    }
-    // The exponent is written with at least three digits, as the files have always had it.
+namespace {
+
+// The exponent is written with at least three digits, as the files have always had it.
+char* WidenExponent(char* buffer, char* end) noexcept {
     char* e = static_cast<char*>(std::memchr(buffer, 'e', static_cast<std::size_t>(end - buffer)));
     if (!e) return end;
     char* digits = e + 2;  // past the exponent's sign
@@ -372,6 +436,196 @@ char* FormatDouble(double value, char* buffer) noexcept {
     std::memmove(digits + shift, digits, static_cast<std::size_t>(count));
     std::memset(digits, '0', static_cast<std::size_t>(shift));
     return end + shift;
+}
+
+// The C library's own rounding at fifteen digits: exact, but several times slower than the
+// shortest form, so kept for the values where the shortest digits cannot decide.
+char* FormatDoubleExact(double value, char* buffer) noexcept {
+    char* end =
+        std::to_chars(buffer, buffer + kDoubleTextCapacity, value, std::chars_format::general, 15)
+            .ptr;
+    return WidenExponent(buffer, end);
+}
+
+constexpr int kPrecision = 15;
+
+// Powers of ten that doubles hold exactly.
+constexpr double kExactPowersOfTen[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,  1e7,
+                                        1e8,  1e9,  1e10, 1e11, 1e12, 1e13, 1e14, 1e15,
+                                        1e16, 1e17, 1e18, 1e19, 1e20, 1e21, 1e22};
+constexpr int kLargestExactPower = 22;
+
+constexpr char kDigitPairs[] =
+    "00010203040506070809101112131415161718192021222324252627282930313233343536373839"
+    "40414243444546474849505152535455565758596061626364656667686970717273747576777879"
+    "8081828384858687888990919293949596979899";
+
+// "%g" layout of the significant digits d0.d1d2... times 10^exponent: positional when
+// -4 <= exponent < 15, else with an exponent of three digits or more. `count` excludes
+// trailing zeros.
+char* WriteGeneral(char* out, bool negative, const char* digits, int count, int exponent) noexcept {
+    if (negative) *out++ = '-';
+    if (exponent < -4 || exponent >= kPrecision) {
+        *out++ = digits[0];
+        if (count > 1) {
+            *out++ = '.';
+            std::memcpy(out, digits + 1, static_cast<std::size_t>(count - 1));
+            out += count - 1;
+        }
+        *out++ = 'e';
+        *out++ = exponent < 0 ? '-' : '+';
+        const int e = exponent < 0 ? -exponent : exponent;
+        *out++ = static_cast<char>('0' + e / 100);
+        *out++ = static_cast<char>('0' + e / 10 % 10);
+        *out++ = static_cast<char>('0' + e % 10);
+    } else if (exponent >= 0) {
+        const int whole = exponent + 1;  // digits before the point
+        if (count <= whole) {
+            std::memcpy(out, digits, static_cast<std::size_t>(count));
+            out += count;
+            std::memset(out, '0', static_cast<std::size_t>(whole - count));
+            out += whole - count;
+        } else {
+            std::memcpy(out, digits, static_cast<std::size_t>(whole));
+            out += whole;
+            *out++ = '.';
+            std::memcpy(out, digits + whole, static_cast<std::size_t>(count - whole));
+            out += count - whole;
+        }
+    } else {
+        *out++ = '0';
+        *out++ = '.';
+        const int zeros = -exponent - 1;
+        std::memset(out, '0', static_cast<std::size_t>(zeros));
+        out += zeros;
+        std::memcpy(out, digits, static_cast<std::size_t>(count));
+        out += count;
+    }
+    return out;
+}
+
+// For a normal double the distance to its neighbours is below a unit in the fifteenth digit,
+// so at most one fifteen-digit decimal reads back as the double, and when one does it is the
+// correctly rounded fifteen-digit form: that is what printf writes.
+//
+// The quick way to find it: scale by an exact power of ten, round to an integer and check
+// that the integer, scaled back (one correctly rounded operation), gives the value again.
+// Values read from texts of up to fifteen digits, which is what files hold, all pass.
+bool FormatScaled(double magnitude, bool negative, char*& out) noexcept {
+    // The decimal exponent, from the binary one: floor(log10(2^e)) or one more.
+    std::uint64_t bits;
+    std::memcpy(&bits, &magnitude, sizeof bits);
+    const int binaryExponent = static_cast<int>(bits >> 52) - 1023;  // normal: 2^e <= magnitude
+    int exponent = (binaryExponent * 78913) >> 18;  // floor(e * log10(2))
+    const int scale = kPrecision - 1 - exponent;  // makes fifteen digits before the point
+    if (scale < -kLargestExactPower + 1 || scale > kLargestExactPower) return false;
+    double scaled = scale >= 0 ? magnitude * kExactPowersOfTen[scale]
+                               : magnitude / kExactPowersOfTen[-scale];
+    int usedScale = scale;
+    // The estimate is one too small when the value reaches the next power of ten (or rounds
+    // to it). The scaling is not exact; a wrong guess only fails the check below.
+    if (scaled >= 1e15 - 0.5) {
+        ++exponent;
+        --usedScale;
+        if (usedScale < -kLargestExactPower) return false;
+        scaled = usedScale >= 0 ? magnitude * kExactPowersOfTen[usedScale]
+                                : magnitude / kExactPowersOfTen[-usedScale];
+    }
+    std::uint64_t integer = static_cast<std::uint64_t>(scaled + 0.5);
+    const double back = usedScale >= 0
+                            ? static_cast<double>(integer) / kExactPowersOfTen[usedScale]
+                            : static_cast<double>(integer) * kExactPowersOfTen[-usedScale];
+    if (back != magnitude) return false;
+    if (integer >= 1000000000000000ull) {  // rounded up into the next decade: 10^15
+        integer /= 10;
+        ++exponent;
+    }
+    if (integer < 100000000000000ull) return false;  // not fifteen digits: leave it to the slow way
+    char digits[kPrecision + 1];
+    // Two digits at a time from two halves that fit 32 bits.
+    std::uint32_t high = static_cast<std::uint32_t>(integer / 100000000u);  // 7 digits
+    std::uint32_t low = static_cast<std::uint32_t>(integer % 100000000u);   // 8 digits
+    for (int i = kPrecision - 1; i > 7; i -= 2) {
+        std::memcpy(digits + i - 1, kDigitPairs + 2 * (low % 100), 2);
+        low /= 100;
+    }
+    for (int i = 6; i > 0; i -= 2) {
+        std::memcpy(digits + i - 1, kDigitPairs + 2 * (high % 100), 2);
+        high /= 100;
+    }
+    digits[0] = static_cast<char>('0' + high);
+    int count = kPrecision;
+    while (count > 1 && digits[count - 1] == '0') --count;
+    out = WriteGeneral(out, negative, digits, count, exponent);
+    return true;
+}
+
+}  // namespace
+
+char* FormatDouble(double value, char* buffer) noexcept {
+    const double magnitude = std::fabs(value);
+    if (magnitude < 1e15 && value == std::trunc(value) && !(value == 0.0 && std::signbit(value))) {
+        // Whole numbers below 10^15 (axis points, counts) are written by "%.15g" as the plain
+        // integer.
+        return std::to_chars(buffer, buffer + kDoubleTextCapacity, static_cast<long long>(value))
+            .ptr;
+    }
+    // Infinities, NaNs and subnormals: a subnormal's neighbours are so far apart, relative to
+    // its size, that its shortest digits say nothing about its fifteenth digit.
+    if (!(magnitude >= DBL_MIN && magnitude <= DBL_MAX)) {
+        if (value == 0.0) {  // negative zero
+            std::memcpy(buffer, "-0", 2);
+            return buffer + 2;
+        }
+        return FormatDoubleExact(value, buffer);
+    }
+    const bool negative = std::signbit(value);
+    char* out = buffer;
+    if (FormatScaled(magnitude, negative, out)) return out;
+
+    // Otherwise from the shortest digits that read back as the value (the closest such when
+    // several are). With at most fifteen of them they are the fifteen-digit form (above).
+    // With sixteen or seventeen, rounding the digit string gives the rounding of the exact
+    // value unless the tail is exactly "5": a fifteen-digit rounding boundary strictly
+    // between the value and its shortest digits would itself read back as the value while
+    // being shorter, or as short and closer.
+    char shortest[kDoubleTextCapacity];
+    const char* const shortestEnd = std::to_chars(shortest, shortest + sizeof shortest, magnitude,
+                                                  std::chars_format::scientific)
+                                        .ptr;
+    // Form: d[.ddd]e(+|-)dd[d]
+    const char* p = shortest;
+    char digits[20];
+    int count = 0;
+    digits[count++] = *p++;
+    if (*p == '.') {
+        ++p;
+        while (*p != 'e') digits[count++] = *p++;
+    }
+    ++p;  // 'e'
+    const bool negativeExponent = *p++ == '-';
+    int exponent = 0;
+    for (; p != shortestEnd; ++p) exponent = exponent * 10 + (*p - '0');
+    if (negativeExponent) exponent = -exponent;
+
+    if (count > kPrecision) {
+        if (count == kPrecision + 1 && digits[kPrecision] == '5')
+            return FormatDoubleExact(value, buffer);  // a tie in the digits; the binary decides
+        const bool up = digits[kPrecision] >= '5';
+        count = kPrecision;
+        if (up) {
+            int i = kPrecision - 1;
+            while (i >= 0 && digits[i] == '9') digits[i--] = '0';
+            if (i >= 0) {
+                ++digits[i];
+            } else {  // 9.99...9 became 10.00...0
+                digits[0] = '1';
+                ++exponent;
+            }
+        }
+    }
+    while (count > 1 && digits[count - 1] == '0') --count;
+    return WriteGeneral(buffer, negative, digits, count, exponent);
 }
 
 }  // namespace detail

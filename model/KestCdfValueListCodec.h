@@ -54,6 +54,28 @@ private:
     std::u16string_view m_view;
 };
 
+/// The text of a node's value as a _bstr_t: a string value's own string, taken over without a
+/// copy; anything else converted by the platform (throws _com_error when it has no text form).
+_bstr_t TakeText(_variant_t value);
+
+/// A VT_BSTR value that lends `text` to a call taking a _variant_t, without copying it: the
+/// text is neither copied nor freed, must outlive this object, and the callee must not change
+/// the value.
+class LentText {
+public:
+    explicit LentText(BSTR text) noexcept {
+        m_value.vt = VT_BSTR;
+        m_value.bstrVal = text;
+    }
+    ~LentText() { m_value.Detach(); }
+    LentText(const LentText&) = delete;
+    LentText& operator=(const LentText&) = delete;
+    const _variant_t& Get() const noexcept { return m_value; }
+
+private:
+    _variant_t m_value;
+};
+
 /// The number of elements to allocate for a text: 0 unless `numeric`; else the number of
 /// spaces plus 1 (1 for a text without spaces, the empty text included).
 int CountValues(bool numeric, std::u16string_view text) noexcept;
