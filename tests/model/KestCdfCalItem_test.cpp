@@ -131,22 +131,6 @@ TEST(KestCdfCalItem, WriteErrorsCarryTheItemsName) {
         E_POINTER);
 }
 
-TEST(KestCdfCalItem, WritesEveryElementInTheNamespace) {
-    IXMLDOMDocument2Ptr source, doc;
-    KestCdfCalItem item;
-    item.ConvertCalItemNode(
-        test::RootOf(Item(u"<NAME>n</NAME>" + kAxis1 + kValue + u"<NOTE>x</NOTE>"), source));
-    IXMLDOMNodePtr written = test::WriteBelow(item, doc, [](auto& i, auto parent, auto& d) {
-        i.ConvertCalItemNodeToXML(parent, d.GetInterfacePtr(), Ns(u"urn:cdf"));
-    });
-    EXPECT_EQ(written->GetnamespaceURI().ToString(), "urn:cdf");
-    EXPECT_EQ(test::ChildNames(written), "NAME AXIS VALUE NOTE");
-    for (IXMLDOMNodePtr child = written->GetfirstChild(); child; child = child->GetnextSibling()) {
-        SCOPED_TRACE(child->GetnodeName().ToString());
-        EXPECT_EQ(child->GetnamespaceURI().ToString(), "urn:cdf");
-    }
-}
-
 TEST(KestCdfCalItem, CopiesShareValueAndAxes) {
     IXMLDOMDocument2Ptr doc;
     KestCdfCalItem* item = new KestCdfCalItem;

@@ -24,19 +24,13 @@ inline IXMLDOMDocument2Ptr NewDocument() {
     return doc;
 }
 
-/// A document loaded from XML text; the test fails when it does not load.
-inline IXMLDOMDocument2Ptr LoadXml(const std::u16string& xml) {
-    IXMLDOMDocument2Ptr doc = NewDocument();
-    if (!doc->loadXML(_bstr_t(xml))) {
-        ADD_FAILURE() << "does not load: " << Utf16ToUtf8(xml) << "\n"
-                      << _bstr_t(doc->GetparseError()->Getreason()).ToString();
-    }
-    return doc;
-}
-
-/// The document element of XML text.
+/// The document element of XML text, loaded into `keep`; the test fails when it does not load.
 inline IXMLDOMNodePtr RootOf(const std::u16string& xml, IXMLDOMDocument2Ptr& keep) {
-    keep = LoadXml(xml);
+    keep = NewDocument();
+    if (!keep->loadXML(_bstr_t(xml))) {
+        ADD_FAILURE() << "does not load: " << Utf16ToUtf8(xml) << "\n"
+                      << _bstr_t(keep->GetparseError()->Getreason()).ToString();
+    }
     return keep->GetdocumentElement();
 }
 
