@@ -15,7 +15,22 @@ using detail::DomNode;
 
 namespace {
 
-_bstr_t ToBstr(std::string_view utf8) { return _bstr_t(Utf8ToUtf16(utf8)); }
+// Straight from the stored UTF-8 into one BSTR: values are read often enough (every number list
+// of a file) that intermediate strings show in profiles.
+BSTR NewBstr(std::string_view utf8) {
+    BSTR text = SysAllocStringFromUtf8(utf8);
+    if (!text) throw _com_error(E_OUTOFMEMORY);
+    return text;
+}
+
+_bstr_t ToBstr(std::string_view utf8) { return _bstr_t(NewBstr(utf8), false); }
+
+_variant_t TextVariant(std::string_view utf8) {
+    _variant_t value;
+    value.bstrVal = NewBstr(utf8);
+    value.vt = VT_BSTR;
+    return value;
+}
 
 _variant_t NullVariant() {
     _variant_t v;
@@ -37,10 +52,10 @@ _variant_t IXMLDOMNode::GetnodeValue() const {
         case NODE_TEXT:
         case NODE_CDATA_SECTION:
         case NODE_COMMENT:
-            return _variant_t(ToBstr(m_node->Text()));
+            return TextVariant(m_node->Text());
         case NODE_PROCESSING_INSTRUCTION:
-            return _variant_t(ToBstr(m_node->IsDeclaration() ? detail::DeclarationText(m_node)
-                                                             : std::string(m_node->Text())));
+            return TextVariant(m_node->IsDeclaration() ? detail::DeclarationText(m_node)
+                                                       : std::string(m_node->Text()));
         default:
             return NullVariant();
     }
@@ -49,8 +64,14 @@ _variant_t IXMLDOMNode::GetnodeValue() const {
 void IXMLDOMNode::PutnodeValue(const _variant_t& value) {
     if (m_node->Type() == NODE_ELEMENT || m_node->Type() == NODE_DOCUMENT)
         throw _com_error(E_FAIL, "elements and documents have no value of their own");
-    _bstr_t text = value;  // a value that cannot become text fails here
-    std::string utf8 = Utf16ToUtf8(text.View());
+    // A value that cannot become text fails here; a string is taken without a copy.
+    std::string utf8;
+    if (value.vt == VT_BSTR) {
+        utf8 = Utf16ToUtf8(BstrView(value.bstrVal));
+    } else {
+        _bstr_t text = value;
+        utf8 = Utf16ToUtf8(text.View());
+    }
     if (m_node->IsDeclaration()) {
         detail::SetDeclarationText(*m_doc, m_node, utf8);
     } else {
