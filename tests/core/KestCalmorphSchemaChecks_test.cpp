@@ -4,6 +4,7 @@
 #include <string>
 
 #include "core/KestCalmorph.h"
+#include "model/ModelTestDom.h"
 #include "support/HttpServer.h"
 #include "support/T2Files.h"
 
@@ -225,20 +226,13 @@ TEST(KestCalmorphSchemaChecks, ValidatesAgainstTheGivenSchema) {
     KestCalmorph converter;
     for (const char* name : {"none.xsd", "broken.xsd"}) {
         SCOPED_TRACE(name);
-        try {
-            converter.ValidateXMLFileWithLocaleXSD(CComBSTR(data), CComBSTR(dir / name));
-            ADD_FAILURE() << "no error";
-        } catch (const KestCalmorphDLLError& error) {
-            EXPECT_EQ(error.GetReason(), reason::kSchemaNotLoaded);
-        }
+        test::ExpectDllError(
+            [&] { converter.ValidateXMLFileWithLocaleXSD(CComBSTR(data), CComBSTR(dir / name)); },
+            reason::kSchemaNotLoaded);
     }
     EXPECT_THROW(
         converter.ValidateXMLFileWithLocaleXSD(CComBSTR(data), CComBSTR(dir / "foreign.xsd")),
         _com_error);
-    try {
-        converter.ValidateXMLFileWithLocaleXSD(CComBSTR(), CComBSTR(schema));
-        ADD_FAILURE() << "no error";
-    } catch (const _com_error& error) {
-        EXPECT_EQ(error.Error(), E_POINTER);
-    }
+    test::ExpectComError(
+        [&] { converter.ValidateXMLFileWithLocaleXSD(CComBSTR(), CComBSTR(schema)); }, E_POINTER);
 }
