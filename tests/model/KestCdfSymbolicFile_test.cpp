@@ -14,26 +14,28 @@ using test::ExpectDllError;
 using test::Ns;
 
 TEST(KestCdfSymbolicFile, AtohdReadsHexadecimalOnlyWithLowercaseX) {
+    // An 'x' anywhere selects hexadecimal, a capital X alone reads as decimal.
     const struct {
         const char* text;
         int expected;
-    } rows[] = {// an 'x' anywhere selects hexadecimal, a capital X alone reads as decimal
-                {"0xFFFFFFFF", -1},
-                {"0x80000000", INT_MIN},
-                {"0x1a", 26},
-                {"\t\n0x10", 16},
-                {"ffx", 255},
-                {"0xg", 0},
-                {"-0x1", -1},
-                {"0x100000000", -1},
-                {"255", 255},
-                {"12AB", 12},
-                {"0X1A", 0},
-                {"  -42", -42},
-                {"", 0},
-                {"2147483648", INT_MAX},
-                {"-2147483649", INT_MIN},
-                {nullptr, 0}};
+    } rows[] = {
+        {"0xFFFFFFFF", -1},
+        {"0x80000000", INT_MIN},
+        {"0x1a", 26},
+        {"\t\n0x10", 16},
+        {"ffx", 255},
+        {"0xg", 0},
+        {"-0x1", -1},
+        {"0x100000000", -1},
+        {"255", 255},
+        {"12AB", 12},
+        {"0X1A", 0},
+        {"  -42", -42},
+        {"", 0},
+        {"2147483648", INT_MAX},
+        {"-2147483649", INT_MIN},
+        {nullptr, 0},
+    };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.text ? row.text : "(null)");
         EXPECT_EQ(KestCdfSymbolicFile::atohd(row.text), row.expected);
