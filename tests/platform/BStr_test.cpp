@@ -135,8 +135,7 @@ TEST(BStr, Utf8ToUtf16ReplacesEachMaximalIllFormedSubpart) {
 TEST(BStr, Utf16ToUtf8ReplacesUnpairedSurrogates) {
     struct Row { const char* label; std::u16string utf16; std::string utf8; } rows[] = {
         {"two and three byte", u"\u00E9\u20AC", "\xC3\xA9\xE2\x82\xAC"},
-        {"pair", u"\U0001F600", "\xF0\x9F\x98\x80"},
-        {"lone high", u"a\xD800z", "a\xEF\xBF\xBDz"},
+        {"pair", u"\U0001F600", "\xF0\x9F\x98\x80"}, {"lone high", u"a\xD800z", "a\xEF\xBF\xBDz"},
         {"lone high at end", u"a\xDBFF", "a\xEF\xBF\xBD"},
         {"reversed pair", u"\xDC00\xD800", "\xEF\xBF\xBD\xEF\xBF\xBD"},
         {"high then pair", u"\xD800\xD83D\xDE00", "\xEF\xBF\xBD\xF0\x9F\x98\x80"},
