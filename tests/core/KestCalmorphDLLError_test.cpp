@@ -44,8 +44,7 @@ TEST(KestCalmorphDLLError, ReasonCodesAreDistinct) {
         reason::kChangeCountUnset, reason::kYearOutOfRange, reason::kMonthOutOfRange,
         reason::kDayOutOfRange, reason::kHourOutOfRange, reason::kMinuteOutOfRange,
         reason::kSecondOutOfRange, reason::kDateTextLength, reason::kCalDataNoAttributeMap,
-        reason::kCalDataAttributeMissing, reason::kSchemaNotLoaded,
-        reason::kSchemaLocationAbsent};
+        reason::kCalDataAttributeMissing, reason::kSchemaNotLoaded, reason::kSchemaLocationAbsent};
     std::set<int> seen;
     for (int code : codes) {
         SCOPED_TRACE(code);

@@ -19,16 +19,9 @@
 #include "support/HttpServer.h"
 #include "support/T1TestFiles.h"
 
-using kest::S_OK;
-using kest::XML_E_INVALID;
-using kest::XML_E_PARSEFAILED;
-using kest::detail::HttpGet;
-using kest::detail::HttpResult;
-using kest::detail::SchemaRef;
-using kest::detail::ValidateAgainstNamedSchemas;
-using kest::detail::ValidationOutcome;
-using kest::test::ReadWholeFile;
-using kest::test::ScratchDir;
+using namespace kest;
+using namespace kest::detail;
+using namespace kest::test;
 
 namespace {
 
@@ -37,6 +30,11 @@ const std::string kCdfXsd = std::string(KEST_SOURCE_DIR) + "/schema/cdf.xsd";
 const std::string kDataDir = std::string(KEST_TEST_DATA_DIR) + "/schema";
 const std::string kValidCdf = ReadWholeFile(kDataDir + "/valid-compact.cdf");
 const std::string kXsdOpen = "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" ";
+
+ValidationOutcome Validate(const std::string& document, const std::string& path,
+                           const std::vector<SchemaRef>& refs, bool http = false) {
+    return ValidateAgainstNamedSchemas(document, path, refs, http);
+}
 
 /// A tiny schema: root <r> in `ns` holding one <v> of the given simple type.
 std::string TinySchema(const std::string& ns, const std::string& type) {
@@ -100,7 +98,7 @@ void SetModificationTime(const std::string& path, time_t seconds) {
 }  // namespace
 
 TEST(SchemaValidation, CdfDocumentsAgainstTheCdfSchema) {
-    struct Row { const char* file; kest::HRESULT code; long line; const char* fragment; } rows[] = {
+    struct Row { const char* file; HRESULT code; long line; const char* fragment; } rows[] = {
         {"valid-compact.cdf", S_OK, 0, ""},
         {"valid-indented.cdf", S_OK, 0, ""},
         {"missing-filename.cdf", XML_E_INVALID, 7,
@@ -115,8 +113,7 @@ TEST(SchemaValidation, CdfDocumentsAgainstTheCdfSchema) {
     for (const Row& row : rows) {
         SCOPED_TRACE(row.file);
         std::string path = kDataDir + "/" + row.file;
-        ValidationOutcome outcome =
-            ValidateAgainstNamedSchemas(ReadWholeFile(path), path, {{kCdfNs, kCdfXsd}}, false);
+        ValidationOutcome outcome = Validate(ReadWholeFile(path), path, {{kCdfNs, kCdfXsd}});
         EXPECT_EQ(outcome.code, row.code) << outcome.reason;
         EXPECT_EQ(outcome.line, row.line);
         std::string prefix = row.code == S_OK ? "" : path + ":" + std::to_string(row.line) + ": ";
@@ -124,7 +121,7 @@ TEST(SchemaValidation, CdfDocumentsAgainstTheCdfSchema) {
         EXPECT_CONTAINS(outcome.reason, row.fragment);
         EXPECT_EQ(outcome.reason.empty(), row.code == S_OK) << outcome.reason;
     }
-    ValidationOutcome outcome = ValidateAgainstNamedSchemas("<r/>", "d.xml", {}, false);
+    ValidationOutcome outcome = Validate("<r/>", "d.xml", {});
     EXPECT_EQ(outcome.code, XML_E_INVALID);
     EXPECT_CONTAINS(outcome.reason, "names no schema");
 }
@@ -138,8 +135,7 @@ TEST(SchemaValidation, RelativeLocationsResolveAgainstTheDocumentDirectory) {
     for (std::string location : {"cdf.xsd", "../schemas/../data/cdf.xsd",
                                  "../with space %20/cdf.xsd", fileUrl.c_str()}) {
         SCOPED_TRACE(location);
-        ValidationOutcome outcome =
-            ValidateAgainstNamedSchemas(kValidCdf, dir / "data/a.cdf", {{kCdfNs, location}}, false);
+        ValidationOutcome outcome = Validate(kValidCdf, dir / "data/a.cdf", {{kCdfNs, location}});
         EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
     }
 }
@@ -172,12 +168,10 @@ TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
         {kCdfNs, "imports-http.xsd",
          "http://127.0.0.1:9/b.xsd requires the ServerHTTPRequest property"},
         {"urn:other", kCdfXsd,
-         "has target namespace '" + kCdfNs + "', but the document names it for 'urn:other'"},
-    };
+         "has target namespace '" + kCdfNs + "', but the document names it for 'urn:other'"}, };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.location);
-        ValidationOutcome outcome =
-            ValidateAgainstNamedSchemas(kValidCdf, dir / "a.cdf", {{row.ns, row.location}}, false);
+        ValidationOutcome outcome = Validate(kValidCdf, dir / "a.cdf", {{row.ns, row.location}});
         EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
         EXPECT_CONTAINS(outcome.reason, row.fragment);
     }
@@ -186,13 +180,12 @@ TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
 TEST(SchemaValidation, MalformedDocumentGivesParseFailureWithPosition) {
     std::string document =
         "<?xml version=\"1.0\"?>\n<CAL-DATA xmlns=\"" + kCdfNs + "\"><CHANGE-HISTORY>\n</CAL-DATA>";
-    ValidationOutcome outcome =
-        ValidateAgainstNamedSchemas(document, "/d/m.cdf", {{kCdfNs, kCdfXsd}}, false);
+    ValidationOutcome outcome = Validate(document, "/d/m.cdf", {{kCdfNs, kCdfXsd}});
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
     EXPECT_EQ(outcome.line, 3);
     EXPECT_GT(outcome.column, 0);
     EXPECT_EQ(outcome.reason.rfind("/d/m.cdf:3: ", 0), 0u) << outcome.reason;
-    outcome = ValidateAgainstNamedSchemas("", "/d/empty.cdf", {{kCdfNs, kCdfXsd}}, false);
+    outcome = Validate("", "/d/empty.cdf", {{kCdfNs, kCdfXsd}});
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
     EXPECT_CONTAINS(outcome.reason, "/d/empty.cdf");
 }
@@ -203,11 +196,9 @@ TEST(SchemaValidation, ExternalEntitiesAndDtdsAreNeverRead) {
     dir.Write("broken.ent", "<unclosed");
     dir.Write("broken.dtd", "<!ELEMENT");
     dir.Write("t.xsd", TinySchema("urn:t", "xs:string"));
-    std::string document =
-        "<?xml version=\"1.0\"?>\n<!DOCTYPE r SYSTEM \"broken.dtd\" [\n"
+    std::string document = "<?xml version=\"1.0\"?>\n<!DOCTYPE r SYSTEM \"broken.dtd\" [\n"
         "<!ENTITY ext SYSTEM \"broken.ent\">]>\n<r xmlns=\"urn:t\"><v>&ext;</v></r>";
-    ValidationOutcome outcome =
-        ValidateAgainstNamedSchemas(document, dir / "doc.xml", {{"urn:t", "t.xsd"}}, false);
+    ValidationOutcome outcome = Validate(document, dir / "doc.xml", {{"urn:t", "t.xsd"}});
     EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
 }
 
@@ -221,9 +212,7 @@ TEST(SchemaValidation, CacheFollowsTheSchemaFileModificationTime) {
     auto validate = [&](const std::string& schema, time_t seconds) {
         dir.Write("t.xsd", schema);
         SetModificationTime(schemaPath, seconds);
-        return ValidateAgainstNamedSchemas(TinyDocument("urn:t", "text"), dir / "d.xml",
-                                           {{"urn:t", "t.xsd"}}, false)
-            .code;
+        return Validate(TinyDocument("urn:t", "text"), dir / "d.xml", {{"urn:t", "t.xsd"}}).code;
     };
     EXPECT_EQ(validate(intSchema, 1000000000), XML_E_INVALID);
     // Content changed behind an unchanged time and size: the compiled schema is reused.
@@ -240,7 +229,7 @@ TEST(SchemaValidation, ConcurrentValidationsShareCompiledSchemas) {
     struct Case {
         std::string document, path;
         SchemaRef schema;
-        kest::HRESULT code;
+        HRESULT code;
         long line;
     } cases[] = {
         {kValidCdf, "v.cdf", {kCdfNs, kCdfXsd}, S_OK, 0},
@@ -252,8 +241,7 @@ TEST(SchemaValidation, ConcurrentValidationsShareCompiledSchemas) {
     auto work = [&](int thread) {
         for (int i = 0; i < 20; ++i) {
             const Case& c = cases[(thread + i) % 4];
-            ValidationOutcome outcome =
-                ValidateAgainstNamedSchemas(c.document, c.path, {c.schema}, false);
+            ValidationOutcome outcome = Validate(c.document, c.path, {c.schema});
             if (outcome.code != c.code || outcome.line != c.line) ++wrong;
         }
     };
@@ -275,9 +263,8 @@ TEST(SchemaValidation, SeveralNamedSchemasValidateTogether) {
                          "</xs:schema>");
     std::vector<SchemaRef> refs = {{"urn:a", "a.xsd"}, {"urn:b", "dir with space/b.xsd"}};
     auto validate = [&](const std::string& value) {
-        return ValidateAgainstNamedSchemas(
-            "<r xmlns=\"urn:a\"><n xmlns=\"urn:b\">" + value + "</n></r>", dir / "d.xml", refs,
-            false);
+        std::string document = "<r xmlns=\"urn:a\"><n xmlns=\"urn:b\">" + value + "</n></r>";
+        return Validate(document, dir / "d.xml", refs);
     };
     EXPECT_EQ(validate("7").code, S_OK) << validate("7").reason;
     ValidationOutcome outcome = validate("seven");
@@ -295,26 +282,23 @@ TEST(SchemaValidation, HttpSchemasNeedPermissionAndResolveAgainstHttpDocuments) 
     dir.Write("schemas/cdf.xsd", ReadWholeFile(kCdfXsd));
     dir.Write("schemas/wrapper.xsd", kXsdOpen + "targetNamespace=\"" + kCdfNs +
                                          "\"><xs:include schemaLocation=\"cdf.xsd\"/></xs:schema>");
-    kest::test::LocalHttpServer server(dir.Path().string());
+    LocalHttpServer server(dir.Path().string());
     if (!server.Started()) GTEST_SKIP() << server.Error();
     std::string invalid = ReadWholeFile(kDataDir + "/wrong-order.cdf");
     std::string url = server.Url("schemas/cdf.xsd");
 
-    ValidationOutcome outcome =
-        ValidateAgainstNamedSchemas(kValidCdf, "/d/a.cdf", {{kCdfNs, url}}, false);
+    ValidationOutcome outcome = Validate(kValidCdf, "/d/a.cdf", {{kCdfNs, url}});
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
     EXPECT_EQ(outcome.reason,
               "schema location " + url + " requires the ServerHTTPRequest property");
-    EXPECT_EQ(ValidateAgainstNamedSchemas(kValidCdf, "/d/a.cdf", {{kCdfNs, url}}, true).code, S_OK);
-    EXPECT_EQ(ValidateAgainstNamedSchemas(invalid, "/d/a.cdf", {{kCdfNs, url}}, true).code,
-              XML_E_INVALID);
+    EXPECT_EQ(Validate(kValidCdf, "/d/a.cdf", {{kCdfNs, url}}, true).code, S_OK);
+    EXPECT_EQ(Validate(invalid, "/d/a.cdf", {{kCdfNs, url}}, true).code, XML_E_INVALID);
     // A relative location of a document loaded over http; the schema includes a relative
     // neighbour, fetched the same way.
-    outcome = ValidateAgainstNamedSchemas(kValidCdf, server.Url("data/a.cdf"),
+    outcome = Validate(kValidCdf, server.Url("data/a.cdf"),
                                           {{kCdfNs, "../schemas/wrapper.xsd"}}, true);
     EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
-    outcome = ValidateAgainstNamedSchemas(kValidCdf, "/d/a.cdf",
-                                          {{kCdfNs, server.Url("none.xsd")}}, true);
+    outcome = Validate(kValidCdf, "/d/a.cdf", {{kCdfNs, server.Url("none.xsd")}}, true);
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);
     EXPECT_CONTAINS(outcome.reason, "HTTP status 404");
     EXPECT_CONTAINS(outcome.reason, server.Url("none.xsd"));
@@ -325,7 +309,7 @@ TEST(HttpGet, FetchesFollowsRedirectsAndReportsStatus) {
     std::string body(100000, 'x');
     dir.Write("big.txt", body);
     dir.Write("folder/index.html", "<p>index</p>");
-    kest::test::LocalHttpServer server(dir.Path().string());
+    LocalHttpServer server(dir.Path().string());
     if (!server.Started()) GTEST_SKIP() << server.Error();
 
     HttpResult result = HttpGet(server.Url("big.txt"), 10, body.size());
@@ -344,7 +328,7 @@ TEST(HttpGet, FetchesFollowsRedirectsAndReportsStatus) {
 }
 
 TEST(HttpGet, SilentServerTimesOut) {
-    kest::test::SilentServer server;
+    SilentServer server;
     ASSERT_TRUE(server.Started());
     auto start = std::chrono::steady_clock::now();
     HttpResult result = HttpGet(server.Url("x.xsd"), 1);
@@ -364,7 +348,7 @@ TEST(HttpGet, OnlyHttpAndHttpsAreFetched) {
         EXPECT_CONTAINS(result.error, "only http and https");
     }
     // Connection refused is reported, not hidden.
-    int port = kest::test::FindFreeLocalPort();
+    int port = FindFreeLocalPort();
     HttpResult result = HttpGet("http://127.0.0.1:" + std::to_string(port) + "/x", 2);
     EXPECT_FALSE(result.ok);
     EXPECT_FALSE(result.error.empty());

@@ -38,7 +38,6 @@ TEST(VariantT, ConstructorsSetTheNaturalType) {
     EXPECT_EQ(_variant_t(1.5f).vt, VT_R4);
     EXPECT_EQ(_variant_t(true).boolVal, VARIANT_TRUE);
     EXPECT_EQ(BstrView(_variant_t("gr\xC3\xBCn").bstrVal), u"gr\u00FCn");
-    EXPECT_EQ(BstrView(_variant_t(std::u16string(u"u")).bstrVal), u"u");
     _variant_t nullText(_bstr_t{});
     EXPECT_EQ(nullText.vt, VT_BSTR);
     EXPECT_EQ(nullText.bstrVal, nullptr);
@@ -47,8 +46,7 @@ TEST(VariantT, ConstructorsSetTheNaturalType) {
 
     EXPECT_EQ(ThrownCode([] { _variant_t bad(short(1), VT_R8); }), E_INVALIDARG);
     EXPECT_EQ(ThrownCode([] { _variant_t bad(1.0, VT_I4); }), E_INVALIDARG);
-    EXPECT_EQ(ThrownCode([] { _variant_t bad(static_cast<const VARIANT*>(nullptr)); }),
-              E_POINTER);
+    EXPECT_EQ(ThrownCode([] { _variant_t bad(static_cast<const VARIANT*>(nullptr)); }), E_POINTER);
     if (sizeof(long) > 4) {
         EXPECT_EQ(ThrownCode([] { _variant_t bad(0x100000000L); }), DISP_E_OVERFLOW);
     }
