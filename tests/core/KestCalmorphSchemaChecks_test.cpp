@@ -6,13 +6,13 @@
 #include "core/KestCalmorph.h"
 #include "model/ModelTestDom.h"
 #include "support/HttpServer.h"
-#include "support/T2Files.h"
+#include "support/TestFiles.h"
 
 namespace fs = std::filesystem;
 using namespace kest;
-using test::T2ReadFile;
-using test::T2TempDir;
-using test::T2WriteFile;
+using test::ReadWholeFile;
+using test::ScratchDir;
+using test::WriteWholeFile;
 
 namespace {
 
@@ -47,8 +47,8 @@ class CurrentDirectory {
 }  // namespace
 
 TEST(KestCalmorphSchemaChecks, ExampleSchemaIsACopyOfTheSchema) {
-    ASSERT_FALSE(T2ReadFile(kSchema).empty());
-    EXPECT_EQ(T2ReadFile(std::string(KEST_SOURCE_DIR) + "/examples/cdf.xsd"), T2ReadFile(kSchema));
+    ASSERT_FALSE(ReadWholeFile(kSchema).empty());
+    EXPECT_EQ(ReadWholeFile(std::string(KEST_SOURCE_DIR) + "/examples/cdf.xsd"), ReadWholeFile(kSchema));
 }
 
 TEST(KestCalmorphSchemaChecks, ServerFileNameNeedsVersionFourOrLater) {
@@ -73,13 +73,13 @@ TEST(KestCalmorphSchemaChecks, ServiceIsInstalledAndSaysNothing) {
 }
 
 TEST(KestCalmorphSchemaChecks, DetectsTheLocationAfterTheFirstBlank) {
-    T2TempDir dir;
+    ScratchDir dir;
     fs::copy_file(kSchema, dir / "cdf.xsd");
-    T2WriteFile(dir / "other.xsd",
+    WriteWholeFile(dir / "other.xsd",
                 "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
                 "targetNamespace=\"urn:other\"><xs:element name=\"o\"/></xs:schema>");
     const std::string longDirectory(150, 'd');
-    T2WriteFile(dir / (longDirectory + "/cdf.xsd"), T2ReadFile(kSchema));
+    WriteWholeFile(dir / (longDirectory + "/cdf.xsd"), ReadWholeFile(kSchema));
     struct Row {
         const char* label;
         std::string document;  // empty: no file at all
@@ -105,7 +105,7 @@ TEST(KestCalmorphSchemaChecks, DetectsTheLocationAfterTheFirstBlank) {
         SCOPED_TRACE(row.label);
         const std::string path = dir / "data.cdf";
         fs::remove(path);
-        if (!row.document.empty()) T2WriteFile(path, row.document);
+        if (!row.document.empty()) WriteWholeFile(path, row.document);
         KestCalmorph converter;
         CComBSTR message(u"stale");
         try {
@@ -122,10 +122,10 @@ TEST(KestCalmorphSchemaChecks, DetectsTheLocationAfterTheFirstBlank) {
 }
 
 TEST(KestCalmorphSchemaChecks, LocalLocationsAreLookedUpWhereTheyBelong) {
-    T2TempDir dir;
+    ScratchDir dir;
     for (const char* file : {"beside/cdf.xsd", "cwd-with/cdf.xsd", "cwd-with/CDF.XSD",
                              "cwd-with/schemas/other.xsd", "cwd-with/HTTP:/host/cdf.xsd"}) {
-        T2WriteFile(dir / file, "schema");
+        WriteWholeFile(dir / file, "schema");
     }
     fs::create_directories(dir / "cwd-without");
     const std::string with = dir / "cwd-with", without = dir / "cwd-without";
@@ -165,9 +165,9 @@ TEST(KestCalmorphSchemaChecks, LocalLocationsAreLookedUpWhereTheyBelong) {
 }
 
 TEST(KestCalmorphSchemaChecks, HttpLocationsAreFetched) {
-    T2TempDir dir;
+    ScratchDir dir;
     fs::copy_file(kSchema, dir / "cdf.xsd");
-    T2WriteFile(dir / "notes.txt", "plain text, not XML");
+    WriteWholeFile(dir / "notes.txt", "plain text, not XML");
     test::LocalHttpServer server(dir.str());
     if (!server.Started()) GTEST_SKIP() << server.Error();
     const std::string closed =
@@ -188,7 +188,7 @@ TEST(KestCalmorphSchemaChecks, HttpLocationsAreFetched) {
 }
 
 TEST(KestCalmorphSchemaChecks, ValidatesAgainstTheGivenSchema) {
-    T2TempDir dir;
+    ScratchDir dir;
     const std::string schema = dir / "cdf.xsd", data = dir / "data.cdf";
     fs::copy_file(kSchema, schema);
     struct Row {
@@ -205,7 +205,7 @@ TEST(KestCalmorphSchemaChecks, ValidatesAgainstTheGivenSchema) {
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
         fs::remove(data);
-        if (!row.document.empty()) T2WriteFile(data, row.document);
+        if (!row.document.empty()) WriteWholeFile(data, row.document);
         KestCalmorph converter;
         std::string message =
             converter.ValidateXMLFileWithLocaleXSD(CComBSTR(data), CComBSTR(schema)).ToString();
@@ -218,9 +218,9 @@ TEST(KestCalmorphSchemaChecks, ValidatesAgainstTheGivenSchema) {
     }
 
     // Problems of the schema itself are errors, not findings about the data.
-    T2WriteFile(data, Cdf(kNamed));
-    T2WriteFile(dir / "broken.xsd", "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">");
-    T2WriteFile(dir / "foreign.xsd",
+    WriteWholeFile(data, Cdf(kNamed));
+    WriteWholeFile(dir / "broken.xsd", "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">");
+    WriteWholeFile(dir / "foreign.xsd",
                 "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
                 "targetNamespace=\"urn:foreign\"><xs:element name=\"CAL-DATA\"/></xs:schema>");
     KestCalmorph converter;

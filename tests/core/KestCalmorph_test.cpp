@@ -11,13 +11,13 @@
 
 #include "model/KestCdfCalData.h"
 #include "model/ModelTestDom.h"
-#include "support/T2Files.h"
+#include "support/TestFiles.h"
 
 namespace fs = std::filesystem;
 using namespace kest;
-using test::T2ReadFile;
-using test::T2TempDir;
-using test::T2WriteFile;
+using test::ReadWholeFile;
+using test::ScratchDir;
+using test::WriteWholeFile;
 
 namespace {
 
@@ -98,10 +98,10 @@ std::string Element(const _variant_t& value, LONG index) {
 }  // namespace
 
 TEST(KestCalmorph, FailedLoadsKeepTheTreeAndReportOnlyWhenAsked) {
-    T2TempDir dir;
-    T2WriteFile(dir / "broken.cdf", "<CAL-DATA a=\"1\" b=\"2\" c=\"3\"><FILENAME>x</CAL-DATA>");
+    ScratchDir dir;
+    WriteWholeFile(dir / "broken.cdf", "<CAL-DATA a=\"1\" b=\"2\" c=\"3\"><FILENAME>x</CAL-DATA>");
     // Deeper than the loader's nesting limit.
-    T2WriteFile(dir / "deeper.xml", Nested(100000, CalData("too deep")));
+    WriteWholeFile(dir / "deeper.xml", Nested(100000, CalData("too deep")));
     struct Row {
         const char* label;
         std::string path;  // empty: a null path
@@ -158,10 +158,10 @@ TEST(KestCalmorph, ConvertsCalDataOutsideChangeHistoryAndItemsOnly) {
         {"root with two attributes", "<CAL-DATA a=\"1\" b=\"2\"/>", nullptr},
         {"nested root without attributes", "<w><g><CAL-DATA/></g></w>", nullptr},
     };
-    T2TempDir dir;
+    ScratchDir dir;
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
-        T2WriteFile(dir / "doc.xml", row.document);
+        WriteWholeFile(dir / "doc.xml", row.document);
         KestCalmorph converter;
         CComBSTR message(u"before");
         try {
@@ -179,8 +179,8 @@ TEST(KestCalmorph, ConvertsCalDataOutsideChangeHistoryAndItemsOnly) {
 }
 
 TEST(KestCalmorph, WalksDeeplyNestedDocumentsWithoutRecursion) {
-    T2TempDir dir;
-    T2WriteFile(dir / "deep.xml", Nested(9000, CalData("deepest")));  // below the loader's limit
+    ScratchDir dir;
+    WriteWholeFile(dir / "deep.xml", Nested(9000, CalData("deepest")));  // below the loader's limit
 
     // The whole read (load, walk, conversion, freeing the document) runs on a stack of 512 KiB:
     // a walk that took one call frame per level would need more than 56 bytes per frame.
@@ -210,7 +210,7 @@ TEST(KestCalmorph, WalksDeeplyNestedDocumentsWithoutRecursion) {
 }
 
 TEST(KestCalmorph, ReadsTheSampleAndWritesItBackFieldForField) {
-    T2TempDir dir;
+    ScratchDir dir;
     fs::copy_file(std::string(KEST_SOURCE_DIR) + "/examples/cdf.xsd", dir / "cdf.xsd");
     KestCalmorph converter;
     KestCdfCalData original = Read(converter, kSample);
@@ -235,7 +235,7 @@ TEST(KestCalmorph, ReadsTheSampleAndWritesItBackFieldForField) {
     original.SetNote(CComBSTR(note.c_str()));
     const std::string first = dir / "first.cdf", second = dir / "second.cdf";
     ASSERT_TRUE(converter.ConvertCPPToXML(original, CComBSTR(first), CComBSTR(u"c")));
-    const std::string text = T2ReadFile(first);
+    const std::string text = ReadWholeFile(first);
     EXPECT_EQ(text.rfind("<?xml", 0), 0u) << text.substr(0, 80);
     EXPECT_NE(text.substr(0, text.find("?>")).find("encoding=\"UTF-8\""), std::string::npos);
     EXPECT_NE(text.find("><!--c--><CHANGE-HISTORY>"), std::string::npos);
@@ -250,32 +250,32 @@ TEST(KestCalmorph, ReadsTheSampleAndWritesItBackFieldForField) {
         EXPECT_TRUE(after[i] == before[i]) << "value " << i;
     }
     ASSERT_TRUE(converter.ConvertCPPToXML(reread, CComBSTR(second), CComBSTR(u"c")));
-    EXPECT_TRUE(T2ReadFile(second) == text);
+    EXPECT_TRUE(ReadWholeFile(second) == text);
 
     for (const CComBSTR& none : {CComBSTR(u""), CComBSTR()}) {  // no comment at all
         ASSERT_TRUE(converter.ConvertCPPToXML(reread, CComBSTR(second), none));
-        EXPECT_EQ(T2ReadFile(second).find("<!--"), std::string::npos);
+        EXPECT_EQ(ReadWholeFile(second).find("<!--"), std::string::npos);
     }
 }
 
 TEST(KestCalmorph, FailedWritesLeaveTheDirectoryAsItWas) {
-    T2TempDir dir;
+    ScratchDir dir;
     KestCalmorph converter;
     KestCdfCalData data = Read(converter, kSample);
     EXPECT_FALSE(converter.ConvertCPPToXML(data, CComBSTR(u""), CComBSTR(u"c")));
     EXPECT_FALSE(converter.ConvertCPPToXML(data, CComBSTR(), CComBSTR(u"c")));
     EXPECT_THROW(converter.ConvertCPPToXML(data, CComBSTR(dir / "missing/out.cdf"), CComBSTR()),
                  _com_error);
-    EXPECT_TRUE(fs::is_empty(dir.path()));
+    EXPECT_TRUE(fs::is_empty(dir.Path()));
 
     // A tree the writer refuses deep inside, after much was built, leaves the old file alone.
     const std::string path = dir / "out.cdf";
-    T2WriteFile(path, "previous content");
+    WriteWholeFile(path, "previous content");
     data.GetCalLists()[0].GetCalItems()[1].SetCalItemValue(nullptr);
     test::ExpectDllError([&] { converter.ConvertCPPToXML(data, CComBSTR(path), CComBSTR(u"c")); },
                          reason::kCalItemValueMissing, "TorqueLimit");
-    EXPECT_EQ(T2ReadFile(path), "previous content");
-    EXPECT_EQ(std::distance(fs::directory_iterator(dir.path()), fs::directory_iterator()), 1);
+    EXPECT_EQ(ReadWholeFile(path), "previous content");
+    EXPECT_EQ(std::distance(fs::directory_iterator(dir.Path()), fs::directory_iterator()), 1);
 }
 
 TEST(KestCalmorph, CopiesShareTreeAndParkedDocument) {

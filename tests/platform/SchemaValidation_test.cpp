@@ -17,7 +17,7 @@
 #include <thread>
 
 #include "support/HttpServer.h"
-#include "support/T1TestFiles.h"
+#include "support/TestFiles.h"
 
 using namespace kest;
 using namespace kest::detail;

@@ -6,7 +6,7 @@
 #include "platform/IXMLDOMDocument.h"
 #include "platform/IXMLDOMSchemaCollection.h"
 #include "platform/detail/SchemaValidation.h"
-#include "support/T1TestFiles.h"
+#include "support/TestFiles.h"
 
 using namespace kest;
 using detail::ValidateAgainstCollection;

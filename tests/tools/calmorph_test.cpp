@@ -5,12 +5,12 @@
 #include <string>
 #include <vector>
 
-#include "support/T2Files.h"
+#include "support/TestFiles.h"
 
 namespace fs = std::filesystem;
-using kest::test::T2ReadFile;
-using kest::test::T2TempDir;
-using kest::test::T2WriteFile;
+using kest::test::ReadWholeFile;
+using kest::test::ScratchDir;
+using kest::test::WriteWholeFile;
 
 namespace {
 
@@ -32,13 +32,13 @@ struct Result {
 
 // Runs calmorph with `args` in `directory`, capturing both output streams.
 Result RunTool(const std::vector<std::string>& args, const std::string& directory) {
-    T2TempDir capture;
+    ScratchDir capture;
     std::string command = "cd " + Quote(directory) + " && " + Quote(KEST_CALMORPH_EXE);
     for (const std::string& arg : args) command += " " + Quote(arg);
     command += " >" + Quote(capture / "out") + " 2>" + Quote(capture / "err");
     const int status = std::system(command.c_str());
-    return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, T2ReadFile(capture / "out"),
-            T2ReadFile(capture / "err")};
+    return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, ReadWholeFile(capture / "out"),
+            ReadWholeFile(capture / "err")};
 }
 
 bool Contains(const std::string& text, const std::string& part) {
@@ -54,20 +54,20 @@ std::string Cdf(const std::string& location, const std::string& body) {
 // A directory holding the schema, the sample and files that fail in each of the ways the tool
 // tells apart.
 struct Files {
-    T2TempDir dir;
+    ScratchDir dir;
     Files() {
         fs::copy_file(kExamples + "/cdf.xsd", dir / "cdf.xsd");
         fs::copy_file(kExamples + "/sample.cdf", dir / "sample.cdf");
-        T2WriteFile(dir / "invalid.cdf", Cdf("cdf.xsd", "\n<NOTE>no FILENAME before me</NOTE>"));
-        T2WriteFile(dir / "malformed.cdf", Cdf("cdf.xsd", "\n<FILENAME>f</NOTE>"));
-        T2WriteFile(dir / "elsewhere.cdf", Cdf("nowhere.xsd", "<FILENAME>f</FILENAME>"));
-        T2WriteFile(dir / "unnamed.cdf", "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><FILENAME/></CAL-DATA>");
-        T2WriteFile(dir / "twoattrs.cdf", "<CAL-DATA a=\"1\" b=\"2\"/>");
-        T2WriteFile(dir / "other.xml", "<other><thing/></other>");
-        T2WriteFile(dir / "brokenitem.cdf",
+        WriteWholeFile(dir / "invalid.cdf", Cdf("cdf.xsd", "\n<NOTE>no FILENAME before me</NOTE>"));
+        WriteWholeFile(dir / "malformed.cdf", Cdf("cdf.xsd", "\n<FILENAME>f</NOTE>"));
+        WriteWholeFile(dir / "elsewhere.cdf", Cdf("nowhere.xsd", "<FILENAME>f</FILENAME>"));
+        WriteWholeFile(dir / "unnamed.cdf", "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><FILENAME/></CAL-DATA>");
+        WriteWholeFile(dir / "twoattrs.cdf", "<CAL-DATA a=\"1\" b=\"2\"/>");
+        WriteWholeFile(dir / "other.xml", "<other><thing/></other>");
+        WriteWholeFile(dir / "brokenitem.cdf",
                     "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><CAL-LIST><NAME>L</NAME><CAL-ITEM><NAME>"
                     "Broken Item</NAME><AXIS/></CAL-ITEM></CAL-LIST></CAL-DATA>");
-        T2WriteFile(dir / "nameless.cdf",
+        WriteWholeFile(dir / "nameless.cdf",
                     "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><CHANGE-HISTORY/><FILENAME/><CAL-LIST>"
                     "<SYMBOLIC-FILE crc32=\"0x1\">s.a2l</SYMBOLIC-FILE></CAL-LIST></CAL-DATA>");
     }
@@ -97,7 +97,7 @@ TEST(Calmorph, InfoPrintsTheSampleAsRecorded) {
         Result result = RunTool(args, kExamples);
         EXPECT_EQ(result.code, 0);
         EXPECT_EQ(result.err, "");
-        EXPECT_EQ(result.out, T2ReadFile(kGolden + (args.size() == 2 ? "sample-info.txt"
+        EXPECT_EQ(result.out, ReadWholeFile(kGolden + (args.size() == 2 ? "sample-info.txt"
                                                                      : "sample-info-items.txt")));
     }
 }
@@ -108,7 +108,7 @@ TEST(Calmorph, ConvertWritesAValidFileWithTheComment) {
                             files.dir.str());
     EXPECT_EQ(result.code, 0);
     EXPECT_EQ(result.out + result.err, "");
-    std::string text = T2ReadFile(files.dir / "out.cdf");
+    std::string text = ReadWholeFile(files.dir / "out.cdf");
     EXPECT_EQ(text.rfind("<?xml", 0), 0u);
     EXPECT_TRUE(Contains(text, "<!--from the test--><CHANGE-HISTORY>"));
 
@@ -187,7 +187,7 @@ TEST(Calmorph, FailuresExitWithTheirCodeAndNameTheFile) {
         std::string label;
         for (const auto& arg : row.args) label += "'" + arg + "' ";
         SCOPED_TRACE(label);
-        T2WriteFile(files.dir / "existing.cdf", "keep me");
+        WriteWholeFile(files.dir / "existing.cdf", "keep me");
         Result result = RunTool(row.args, files.dir.str());
         EXPECT_EQ(result.code, row.code) << result.err;
         for (const std::string& part : row.err)
@@ -200,7 +200,7 @@ TEST(Calmorph, FailuresExitWithTheirCodeAndNameTheFile) {
         } else {
             EXPECT_EQ(result.out, "");
         }
-        EXPECT_EQ(T2ReadFile(files.dir / "existing.cdf"), "keep me");
+        EXPECT_EQ(ReadWholeFile(files.dir / "existing.cdf"), "keep me");
         EXPECT_FALSE(fs::exists(files.dir / "missing"));
     }
 }

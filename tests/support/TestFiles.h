@@ -43,6 +43,7 @@ class ScratchDir {
     ScratchDir& operator=(const ScratchDir&) = delete;
 
     const std::filesystem::path& Path() const { return m_path; }
+    std::string str() const { return m_path.string(); }
     std::string operator/(const std::string& name) const { return (m_path / name).string(); }
     std::string Write(const std::string& name, const std::string& text) const {
         return WriteWholeFile(m_path / name, text);
