@@ -32,24 +32,56 @@ unsigned int SizeFromDouble(double value) noexcept {
 }
 
 // The size as the signed 32-bit number its bits stand for.
-_bstr_t SizeText(unsigned int size) {
+_variant_t SizeText(unsigned int size) {
     const std::int64_t signedSize =
         size > static_cast<unsigned int>(INT_MAX) ? static_cast<std::int64_t>(size) - 0x100000000LL
                                                   : static_cast<std::int64_t>(size);
-    char buffer[16];
-    char* end = std::to_chars(buffer, buffer + sizeof buffer, signedSize).ptr;
-    return _bstr_t(std::string(buffer, end));
+    char narrow[16];
+    const char* end = std::to_chars(narrow, narrow + sizeof narrow, signedSize).ptr;
+    OLECHAR wide[16];
+    UINT length = 0;
+    for (const char* p = narrow; p != end; ++p) wide[length++] = static_cast<OLECHAR>(*p);
+    _variant_t text;
+    text.bstrVal = SysAllocStringLen(wide, length);
+    if (!text.bstrVal) throw _com_error(E_OUTOFMEMORY);
+    text.vt = VT_BSTR;
+    return text;
 }
 
-_bstr_t TextOf(const KestCdfNormalizedString& text) {
-    return _bstr_t(BstrView(text.m_string.m_str));
+// Names are made once: every axis of a file writes them.
+const _bstr_t& ElementName() {
+    static const _bstr_t name(u"AXIS");
+    return name;
+}
+const _bstr_t& SizeName() {
+    static const _bstr_t name(u"size");
+    return name;
+}
+const _bstr_t& UnitsName() {
+    static const _bstr_t name(u"sw-units");
+    return name;
+}
+const _bstr_t& FormatTypeName() {
+    static const _bstr_t name(u"format-type");
+    return name;
+}
+const _bstr_t& NoName() {
+    static const _bstr_t name(u"");
+    return name;
 }
 
 void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const OLECHAR* name, const _bstr_t& value) {
-    IXMLDOMNodePtr attribute = doc->createAttribute(_bstr_t(name));
-    attribute->PutnodeValue(_variant_t(value));
+                  const _bstr_t& name, const _variant_t& value) {
+    IXMLDOMNodePtr attribute = doc->createAttribute(name);
+    attribute->PutnodeValue(value);
     attributes->setNamedItem(attribute);
+}
+
+// A string member's value is lent to the DOM, which copies it.
+void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
+                  const _bstr_t& name, const KestCdfNormalizedString& value) {
+    const detail::LentText text(value.m_string.m_str);
+    AddAttribute(doc, attributes, name, text.Get());
 }
 
 }  // namespace
@@ -161,23 +193,24 @@ _bstr_t KestCdfAxis::GetNodeString(IXMLDOMNodePtr node) {
 bool KestCdfAxis::ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                        KestCdfNormalizedString ns) {
     if (!doc) throw _com_error(E_POINTER);
-    IXMLDOMNodePtr element =
-        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(u"AXIS"), TextOf(ns));
+    // The namespace is this call's own copy: handed over, not copied again.
+    IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
+                                             ElementName(), _bstr_t(ns.m_string.Detach(), false));
     if (!parent) throw _com_error(E_POINTER);
     parent->appendChild(element);
 
     IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
     if (!attributes) KestCalmorphDLLError::Raise(reason::kAxisWriteNoAttributeMap);
-    AddAttribute(doc, attributes, u"size", SizeText(m_size));
+    AddAttribute(doc, attributes, SizeName(), SizeText(m_size));
     attributes = element->Getattributes();
-    AddAttribute(doc, attributes, u"sw-units", TextOf(m_swUnits));
-    AddAttribute(doc, attributes, u"format-type", TextOf(m_formatType));
+    AddAttribute(doc, attributes, UnitsName(), m_swUnits);
+    AddAttribute(doc, attributes, FormatTypeName(), m_formatType);
 
     // The element stays attached with its attributes when there is nothing to write.
     if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kAxisValueEmpty);
     const _variant_t text = GetNumbersFromSafeArray(m_value);
     IXMLDOMNodePtr textNode =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), NoName(), NoName());
     textNode->PutnodeValue(text);
     element->appendChild(textNode);
     return true;

@@ -9,14 +9,30 @@ namespace kest {
 
 namespace {
 
-_bstr_t TextOf(const KestCdfNormalizedString& text) {
-    return _bstr_t(BstrView(text.m_string.m_str));
+// Names are made once: every item of a file writes them.
+const _bstr_t& ElementName() {
+    static const _bstr_t name(u"VALUE");
+    return name;
+}
+const _bstr_t& UnitsName() {
+    static const _bstr_t name(u"sw-units-ref");
+    return name;
+}
+const _bstr_t& FormatTypeName() {
+    static const _bstr_t name(u"format-type");
+    return name;
+}
+const _bstr_t& NoName() {
+    static const _bstr_t name(u"");
+    return name;
 }
 
+// The attribute's value is lent to the DOM, which copies it.
 void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const OLECHAR* name, const _bstr_t& value) {
-    IXMLDOMNodePtr attribute = doc->createAttribute(_bstr_t(name));
-    attribute->PutnodeValue(_variant_t(value));
+                  const _bstr_t& name, const KestCdfNormalizedString& value) {
+    IXMLDOMNodePtr attribute = doc->createAttribute(name);
+    const detail::LentText text(value.m_string.m_str);
+    attribute->PutnodeValue(text.Get());
     attributes->setNamedItem(attribute);
 }
 
@@ -126,20 +142,21 @@ bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent,
                                                        IXMLDOMDocument* doc,
                                                        KestCdfNormalizedString ns) {
     if (!doc) throw _com_error(E_POINTER);
+    // The namespace is this call's own copy: handed over, not copied again.
     IXMLDOMNodePtr element = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
-                                             _bstr_t(u"VALUE"), TextOf(ns));
+                                             ElementName(), _bstr_t(ns.m_string.Detach(), false));
     if (!parent) throw _com_error(E_POINTER);
     parent->appendChild(element);
 
     IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
-    AddAttribute(doc, attributes, u"sw-units-ref", TextOf(m_units));
-    AddAttribute(doc, attributes, u"format-type", TextOf(m_formatType));
+    AddAttribute(doc, attributes, UnitsName(), m_units);
+    AddAttribute(doc, attributes, FormatTypeName(), m_formatType);
 
     // The element stays attached with its attributes when there is nothing to write.
     if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
     const _variant_t text = GetNumbersFromSafeArray(m_value);
     IXMLDOMNodePtr textNode =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), NoName(), NoName());
     textNode->PutnodeValue(text);
     element->appendChild(textNode);
     return true;

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <functional>
 #include <limits>
 #include <locale.h>
 #include <random>
@@ -202,6 +203,105 @@ TEST(KestCdfValueListCodec, FormatsRandomShortDecimalsLikePrintf) {
     }
 }
 
+// The formatter takes the fifteen digits from a scaled integer or from the shortest digits
+// that read back, and falls back to exact rounding only on ties; every family of values where
+// those shortcuts could go wrong is compared with printf bit for bit.
+TEST(KestCdfValueListCodec, FormatsMillionsOfDoublesExactlyLikePrintf) {
+    std::mt19937_64 random(20261206u);
+    auto fromText = [](const char* text) { return ReferenceAtof(text); };
+    auto withNeighbours = [](double value, const std::function<void(double)>& check) {
+        check(value);
+        check(-value);
+        check(std::nextafter(value, 0.0));
+        check(std::nextafter(value, std::numeric_limits<double>::infinity()));
+    };
+    struct Family {
+        const char* name;
+        std::function<void(const std::function<void(double)>&)> generate;
+    } families[] = {
+        {"any bit pattern",
+         [&](const auto& check) {
+             for (int i = 0; i < 3000000; ++i) {
+                 const std::uint64_t bits = random();
+                 double value;
+                 std::memcpy(&value, &bits, sizeof value);
+                 check(value);
+             }
+         }},
+        {"any mantissa between 1e-12 and 1e21",
+         [&](const auto& check) {
+             for (int i = 0; i < 1000000; ++i) {
+                 std::uint64_t bits = random() & 0x800FFFFFFFFFFFFFull;
+                 bits |= std::uint64_t(1023 - 40 + random() % 110) << 52;
+                 double value;
+                 std::memcpy(&value, &bits, sizeof value);
+                 check(value);
+             }
+         }},
+        {"k/255 times powers of ten",
+         [&](const auto& check) {
+             for (int e = -25; e <= 25; ++e)
+                 for (int k = 0; k <= 255 * 20; ++k) check(k / 255.0 * std::pow(10.0, e));
+         }},
+        {"fifteen-digit texts read back, and their neighbours",
+         [&](const auto& check) {
+             for (int e = -25; e <= 25; ++e)
+                 for (int k = 0; k <= 2000; ++k) {
+                     char text[64];
+                     std::snprintf(text, sizeof text, "%.15g", k * (100.0 / 255) * std::pow(10.0, e));
+                     withNeighbours(fromText(text), check);
+                 }
+         }},
+        {"integers of every size",
+         [&](const auto& check) {
+             for (int i = 0; i < 250000; ++i)
+                 check(static_cast<double>(static_cast<std::int64_t>(random() >> (random() % 64))));
+         }},
+        {"powers of ten and their neighbours",
+         [&](const auto& check) {
+             for (int e = -323; e <= 308; ++e) {
+                 char text[16];
+                 std::snprintf(text, sizeof text, "1e%d", e);
+                 withNeighbours(fromText(text), check);
+             }
+         }},
+        {"sixteen digits ending in 5 (ties in the digits), and their neighbours",
+         [&](const auto& check) {
+             for (int i = 0; i < 250000; ++i) {
+                 char text[64];
+                 const unsigned long long digits = 100000000000000ull + random() % 900000000000000ull;
+                 const int exponent = i % 4 ? static_cast<int>(random() % 80) - 40
+                                            : static_cast<int>(random() % 600) - 300;
+                 std::snprintf(text, sizeof text, "%llu5e%d", digits, exponent);
+                 withNeighbours(fromText(text), check);
+             }
+         }},
+        {"subnormals",
+         [&](const auto& check) {
+             for (int i = 0; i < 100000; ++i) {
+                 const std::uint64_t bits = random() & 0x800FFFFFFFFFFFFFull;
+                 double value;
+                 std::memcpy(&value, &bits, sizeof value);
+                 check(value);
+             }
+         }},
+    };
+    for (const Family& family : families) {
+        SCOPED_TRACE(family.name);
+        long failures = 0;
+        family.generate([&](double value) {
+            if (failures > 10) return;
+            const std::string expected = ReferenceFormat(value);
+            const std::string actual = Format(value);
+            if (expected != actual) {
+                ++failures;
+                ADD_FAILURE() << std::hexfloat << value << ": printf " << expected << ", got "
+                              << actual;
+            }
+        });
+    }
+}
+
 TEST(KestCdfValueListCodec, CountsSpacesOnlyForNumericText) {
     struct Row {
         bool numeric;
@@ -325,6 +425,54 @@ TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
               std::u16string(BstrView(axis.bstrVal)));
     _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue, false);
     EXPECT_EQ(u"1e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
+}
+
+TEST(KestCdfValueListCodec, LongListsAreWrittenAndReadWhole) {
+    // Far longer than any fixed buffer, so that the text grows on the heap, once of it in one
+    // step larger than doubling.
+    constexpr LONG kNumbers = 3000;
+    const std::u16string longString(20000, u'x');
+    _variant_t array = NewValueArray(kNumbers + 1);
+    std::string expected;
+    std::vector<double> numbers;
+    VARIANT* data = nullptr;
+    ASSERT_EQ(S_OK, SafeArrayAccessData(array.parray, reinterpret_cast<void**>(&data)));
+    for (LONG i = 0; i < kNumbers; ++i) {
+        if (i % 3 == 1) {
+            data[i].vt = VT_I4;
+            data[i].lVal = -i;
+            expected += std::to_string(-i);
+            numbers.push_back(-i);
+        } else {
+            data[i].vt = VT_R8;
+            data[i].dblVal = (i + 0.25) * (100.0 / 255) * (i % 3 ? 1e-9 : 1.0);
+            expected += ReferenceFormat(data[i].dblVal);
+            numbers.push_back(ReferenceAtof(ReferenceFormat(data[i].dblVal)));
+        }
+        expected += ' ';
+    }
+    data[kNumbers].vt = VT_BSTR;
+    data[kNumbers].bstrVal = SysAllocStringLen(longString.data(), longString.size());
+    ASSERT_EQ(S_OK, SafeArrayUnaccessData(array.parray));
+
+    _variant_t text = FormatValueList(array, ElementWriting::kAxis, true);
+    const std::u16string_view written = BstrView(text.bstrVal);
+    const std::u16string expectedText =
+        std::u16string(expected.begin(), expected.end()) + u'"' + longString + u'"';
+    ASSERT_EQ(expectedText, written);
+
+    // Read back: the numbers' part as one text, narrowed in one piece.
+    const std::u16string_view numbersText = written.substr(0, expected.size() - 1);
+    _variant_t back = NewValueArray(static_cast<ULONG>(CountValues(true, numbersText)));
+    FillNumbers(numbersText, NumberTyping::kPerToken, back);
+    const std::vector<_variant_t> elements = Elements(back);
+    ASSERT_EQ(numbers.size(), elements.size());
+    for (std::size_t i = 0; i < elements.size(); ++i) {
+        SCOPED_TRACE(i);
+        const double value =
+            elements[i].vt == VT_R8 ? elements[i].dblVal : static_cast<double>(elements[i].lVal);
+        EXPECT_EQ(Bits(numbers[i]), Bits(value));
+    }
 }
 
 TEST(KestCdfValueListCodec, WritesTheEmptyTextForNoArray) {
