@@ -1,34 +1,27 @@
 #pragma once
-// Helpers shared by the DOM tests: documents, temporary folders and file access.
+// Helpers shared by the DOM tests.
 
-#include <dirent.h>
 #include <gtest/gtest.h>
-#include <stdlib.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
-#include <fstream>
-#include <sstream>
+#include <algorithm>
+#include <filesystem>
+#include <functional>
 #include <string>
 #include <vector>
 
 #include "platform/XmlDom.h"
+#include "support/TestFiles.h"
 
 namespace kest {
 namespace testing {
 
+using test::ReadWholeFile;
+using test::ScratchDir;
+using test::WriteWholeFile;
+
 inline IXMLDOMDocument2Ptr NewDocument() {
     IXMLDOMDocument2Ptr doc;
-    HRESULT hr = doc.CreateInstance(kProgIdDOMDocument40);
-    EXPECT_EQ(hr, S_OK);
-    return doc;
-}
-
-inline IXMLDOMDocument2Ptr Parsed(const std::string& xml) {
-    IXMLDOMDocument2Ptr doc = NewDocument();
-    doc->PutvalidateOnParse(VARIANT_FALSE);
-    EXPECT_EQ(doc->loadBuffer(xml.data(), xml.size()), VARIANT_TRUE)
-        << doc->GetparseError()->Getreason().ToString();
+    EXPECT_EQ(doc.CreateInstance(kProgIdDOMDocument40), S_OK);
     return doc;
 }
 
@@ -38,58 +31,30 @@ inline std::string ReasonOf(const IXMLDOMDocument2Ptr& doc) {
     return doc->GetparseError()->Getreason().ToString();
 }
 
-/// A fresh folder, removed with its files at the end of the scope.
-class TempDir {
-public:
-    TempDir() {
-        char pattern[] = "/tmp/kest-dom-XXXXXX";
-        const char* made = ::mkdtemp(pattern);
-        EXPECT_NE(made, nullptr);
-        m_path = made ? made : "/tmp";
-    }
-    ~TempDir() {
-        for (const std::string& name : Entries()) {
-            std::string p = m_path + "/" + name;
-            ::chmod(p.c_str(), 0700);
-            struct stat st {};
-            if (::stat(p.c_str(), &st) == 0 && S_ISDIR(st.st_mode))
-                ::rmdir(p.c_str());
-            else
-                ::unlink(p.c_str());
-        }
-        ::rmdir(m_path.c_str());
-    }
-    TempDir(const TempDir&) = delete;
-    TempDir& operator=(const TempDir&) = delete;
-
-    const std::string& Path() const { return m_path; }
-    std::string File(const std::string& name) const { return m_path + "/" + name; }
-    std::vector<std::string> Entries() const {
-        std::vector<std::string> names;
-        if (DIR* dir = ::opendir(m_path.c_str())) {
-            while (dirent* e = ::readdir(dir)) {
-                std::string n = e->d_name;
-                if (n != "." && n != "..") names.push_back(n);
-            }
-            ::closedir(dir);
-        }
-        return names;
-    }
-
-private:
-    std::string m_path;
-};
-
-inline void WriteFile(const std::string& path, const std::string& bytes) {
-    std::ofstream out(path, std::ios::binary);
-    out << bytes;
+inline IXMLDOMDocument2Ptr Parsed(const std::string& xml) {
+    IXMLDOMDocument2Ptr doc = NewDocument();
+    doc->PutvalidateOnParse(VARIANT_FALSE);
+    EXPECT_EQ(doc->loadBuffer(xml.data(), xml.size()), VARIANT_TRUE) << ReasonOf(doc);
+    return doc;
 }
 
-inline std::string ReadFile(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    std::ostringstream s;
-    s << in.rdbuf();
-    return s.str();
+/// The HRESULT a call throws, S_OK when it returns.
+inline HRESULT CodeOf(const std::function<void()>& call) {
+    try {
+        call();
+    } catch (const _com_error& e) {
+        return e.Error();
+    }
+    return S_OK;
+}
+
+/// Names in a folder, to see that no temporary file stays behind.
+inline std::vector<std::string> Entries(const ScratchDir& dir) {
+    std::vector<std::string> names;
+    for (const auto& entry : std::filesystem::directory_iterator(dir.Path()))
+        names.push_back(entry.path().filename().string());
+    std::sort(names.begin(), names.end());
+    return names;
 }
 
 }  // namespace testing
