@@ -111,7 +111,8 @@ VARIANT_BOOL LoadBytes(DomDocument& doc, std::string_view bytes, const char* enc
     DomError error;
     detail::MemorySource source(bytes);
     detail::ParsedContent content =
-        detail::ParseXml(source, encoding, url, doc.EffectiveMaxDepth(), error);
+        detail::ParseXml(source, encoding, url, doc.EffectiveMaxDepth(), error, false,
+                         doc.preserveWhiteSpace);
     if (!content.store) {
         doc.Clear();
         doc.error = std::move(error);
@@ -217,7 +218,8 @@ VARIANT_BOOL LoadFile(DomDocument& doc, const std::string& path, const std::stri
             return FailLoad(doc, std::move(error));
         }
     }
-    detail::ParsedContent content = detail::ParseXml(source, nullptr, url, depth, error);
+    detail::ParsedContent content =
+        detail::ParseXml(source, nullptr, url, depth, error, false, doc.preserveWhiteSpace);
     if (!content.store) return FailLoad(doc, std::move(error));
     doc.Install(std::move(content.store), content.top);
     doc.url = url;
@@ -526,6 +528,13 @@ IXMLDOMParseErrorPtr IXMLDOMDocument::GetparseError() const {
 
 void IXMLDOMDocument::Putasync(VARIANT_BOOL async) { m_doc->async = async != VARIANT_FALSE; }
 VARIANT_BOOL IXMLDOMDocument::Getasync() const { return m_doc->async ? VARIANT_TRUE : VARIANT_FALSE; }
+
+void IXMLDOMDocument::PutpreserveWhiteSpace(VARIANT_BOOL preserve) {
+    m_doc->preserveWhiteSpace = preserve != VARIANT_FALSE;
+}
+VARIANT_BOOL IXMLDOMDocument::GetpreserveWhiteSpace() const {
+    return m_doc->preserveWhiteSpace ? VARIANT_TRUE : VARIANT_FALSE;
+}
 
 void IXMLDOMDocument::PutvalidateOnParse(VARIANT_BOOL validate) {
     m_doc->validateOnParse = validate != VARIANT_FALSE;

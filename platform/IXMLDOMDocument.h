@@ -59,6 +59,11 @@ public:
 
     void Putasync(VARIANT_BOOL async);
     VARIANT_BOOL Getasync() const;
+    /// On in a new document: every character the parser delivers is kept, white space between
+    /// elements included. Switched off, a load drops text of white space alone that stands
+    /// beside an element (indentation); white space inside text-only content always stays.
+    void PutpreserveWhiteSpace(VARIANT_BOOL preserve);
+    VARIANT_BOOL GetpreserveWhiteSpace() const;
     /// On in a new document: a load checks the document against the schemas its root names.
     void PutvalidateOnParse(VARIANT_BOOL validate);
     VARIANT_BOOL GetvalidateOnParse() const;

@@ -165,6 +165,7 @@ struct DomDocument {
 
     bool async = true;
     bool validateOnParse = true;
+    bool preserveWhiteSpace = true;
     bool serverHttpRequest = false;
     long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
     ComPtr<IXMLDOMSchemaCollection> schemas;

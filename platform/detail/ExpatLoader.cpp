@@ -31,6 +31,7 @@ struct Builder {
     bool utf8Bom = false;  // the bytes start with a UTF-8 byte order mark (encoding not forced)
     bool rootOnly = false;  // stop once the root element's start tag is built
     bool rootSeen = false;
+    bool dropBlanksBesideElements = false;
     std::string text;  // character data not yet turned into a node
     // Names repeat throughout a document: a small direct-mapped cache in front of the store's
     // table spares the key building and hashing of most lookups.
@@ -76,6 +77,21 @@ struct Builder {
         XML_StopParser(parser, XML_FALSE);
     }
 
+    // Ends the pending text at a tag: `elementFollows` when a child element starts next.
+    // Indentation beside elements carries nothing a reader of element content looks at, and on
+    // large files its nodes cost a good part of the document's memory.
+    void FlushAtTag(bool elementFollows) {
+        if (dropBlanksBesideElements && !text.empty() &&
+            text.find_first_not_of(" \t\r\n") == std::string::npos) {
+            const DomNode* previous = current->LastChild();
+            if (elementFollows || (previous && previous->Type() == NODE_ELEMENT)) {
+                text.clear();
+                return;
+            }
+        }
+        Flush();
+    }
+
     void Flush() {
         if (text.empty()) return;
         DomNode* node = store->NewNode(NODE_TEXT);
@@ -117,7 +133,7 @@ void Guard(void* data, F&& body) {
 
 void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
     Guard(data, [&](Builder& b) {
-        b.Flush();
+        b.FlushAtTag(true);
         if (++b.depth > b.maxDepth) {
             b.Stop("element nesting deeper than " + std::to_string(b.maxDepth));
             return;
@@ -146,7 +162,7 @@ void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
 
 void XMLCALL OnEnd(void* data, const XML_Char*) {
     Guard(data, [&](Builder& b) {
-        b.Flush();
+        b.FlushAtTag(false);
         --b.depth;
         b.current = b.current->parent;
     });
@@ -354,7 +370,8 @@ std::string FileSource::LineAround(long offset) {
 }
 
 ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std::string& url,
-                       long maxElementDepth, DomError& error, bool rootOnly) noexcept {
+                       long maxElementDepth, DomError& error, bool rootOnly,
+                       bool preserveWhiteSpace) noexcept {
     ParsedContent result;
     error = DomError();
     error.url = url;
@@ -371,6 +388,7 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
         b.top = b.current = result.top;
         b.maxDepth = maxElementDepth;
         b.rootOnly = rootOnly;
+        b.dropBlanksBesideElements = !preserveWhiteSpace;
         XML_SetUserData(parser, &b);
         XML_SetElementHandler(parser, OnStart, OnEnd);
         XML_SetCharacterDataHandler(parser, OnCharacters);

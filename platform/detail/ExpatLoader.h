@@ -68,9 +68,12 @@ HRESULT HResultForErrno(int err) noexcept;
 /// Parses the source. `forcedEncoding` (e.g. "UTF-8") overrides BOM and declaration detection;
 /// null lets expat detect the encoding. `url` names the source in error reasons (may be empty).
 /// With `rootOnly` parsing stops after the root element's start tag (for a look at its
-/// attributes). Returns the content, or an empty store with `error` filled. Never throws.
+/// attributes). Without `preserveWhiteSpace`, text of white space alone that stands beside an
+/// element (indentation between elements) is dropped; white space in text-only content stays.
+/// Returns the content, or an empty store with `error` filled. Never throws.
 ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std::string& url,
-                       long maxElementDepth, DomError& error, bool rootOnly = false) noexcept;
+                       long maxElementDepth, DomError& error, bool rootOnly = false,
+                       bool preserveWhiteSpace = true) noexcept;
 
 /// "<what> at line L, column C in URL" (the " in URL" part when url is not empty).
 std::string DescribeLocation(const std::string& what, long line, long column,
