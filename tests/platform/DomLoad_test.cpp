@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <iostream>
 #include <string>
 
 #include "DomTestUtil.h"
@@ -46,40 +47,40 @@ std::string Describe(const List& list) {
 }  // namespace
 
 TEST(DomLoad, BadInputFailsWithReasonAndLocationAndLeavesDocumentEmpty) {
-    struct Row {
+    const struct {
         const char* label;
         std::string bytes;
         const char* reason;  // expected start of the reason
-        long line;
-    };
-    const Row rows[] = {
-        {"mismatched tag", "<a>\n  <b></a>", "mismatched tag at line 2, column 8", 2},
-        {"truncated", "<a><b>text", "no element found at line 1", 1},
-        {"empty", "", "no element found", 1},
-        {"invalid UTF-8", "<a>\xff\xfe</a>", "not well-formed (invalid token) at line 1, column 4",
-         1},
-        {"NUL byte", std::string("<a>x\0y</a>", 10), "not well-formed (invalid token)", 1},
-        {"unknown encoding", "<?xml version=\"1.0\" encoding=\"x-nothing\"?><a/>",
-         "unknown encoding", 1},
-        {"billion laughs", BillionLaughs(), "limit on input amplification factor", 14},
+    } rows[] = {
+        {"mismatched tag", "<a>\n  <b></a>", "mismatched tag at line 2, column 8"},
+        {"truncated", "<a><b>text", "no element found at line 1"},
+        {"empty", "", "no element found at line 1"},
+        {"invalid UTF-8", "<a>\xff\xfe</a>", "not well-formed (invalid token) at line 1, column 4"},
+        {"NUL byte", std::string("<a>x\0y</a>", 10), "not well-formed (invalid token) at line 1"},
+        {"unknown encoding", "<?xml version='1.0' encoding='x-nothing'?><a/>", "unknown encoding"},
+        {"billion laughs", BillionLaughs(),
+         "limit on input amplification factor (from DTD and entities) breached at line 14"},
         {"BOM contradicts declaration",
          "\xef\xbb\xbf<?xml version='1.0' encoding='ISO-8859-1'?><a/>",
-         "encoding \"ISO-8859-1\" declared after a UTF-8 byte order mark at line 1", 1},
+         "encoding \"ISO-8859-1\" declared after a UTF-8 byte order mark at line 1"},
         // expat's ISO-8859-1 and UTF-16 decoders let these through as name characters.
         {"ordinal indicator in a name (ISO-8859-1)",
          "<?xml version='1.0' encoding='ISO-8859-1'?>\n<a\xaa/>",
-         "not well-formed (invalid name character) at line 2", 2},
+         "not well-formed (invalid name character) at line 2"},
         {"micro sign in a name (UTF-16)", std::string("\xff\xfe<\0a\0\xb5\0/\0>\0", 12),
-         "not well-formed (invalid name character) at line 1", 1},
+         "not well-formed (invalid name character) at line 1"},
     };
-    for (const Row& row : rows) {
+    for (const auto& row : rows) {
         SCOPED_TRACE(row.label);
         IXMLDOMDocument2Ptr doc = Parsed("<ok/>");
         ASSERT_EQ(doc->loadBuffer(row.bytes.data(), row.bytes.size()), VARIANT_FALSE);
         IXMLDOMParseErrorPtr error = doc->GetparseError();
         EXPECT_EQ(error->GeterrorCode(), XML_E_PARSEFAILED);
         EXPECT_EQ(ReasonOf(doc).rfind(row.reason, 0), 0u) << ReasonOf(doc);
-        EXPECT_EQ(error->Getline(), row.line);
+        // The reason names the position the fields give.
+        EXPECT_NE(ReasonOf(doc).find(" at line " + std::to_string(error->Getline()) + ", column " +
+                                     std::to_string(error->Getlinepos())),
+                  std::string::npos);
         EXPECT_GT(error->Getlinepos(), 0);
         EXPECT_FALSE(doc->GetfirstChild());
     }
@@ -107,31 +108,26 @@ TEST(DomLoad, ParseErrorGivesPositionSourceLineAndFileName) {
 
 TEST(DomLoad, SourcesThatCannotBeReadNameThePathAndTheCause) {
     ScratchDir dir;
+    HRESULT code = S_OK;
+    auto refusal = [&](const std::string& path) {
+        IXMLDOMDocument2Ptr doc = NewDocument();
+        EXPECT_EQ(doc->load(_variant_t(path)), VARIANT_FALSE);
+        code = doc->GetparseError()->GeterrorCode();
+        EXPECT_TRUE(FAILED(code)) << code;
+        return ReasonOf(doc);
+    };
     const std::string missing = dir / "missing.xml", empty = dir.Write("empty.xml", "");
+    EXPECT_EQ(refusal(missing), "cannot open " + missing + ": No such file or directory");
+    EXPECT_EQ(refusal(dir.str()), "cannot load " + dir.str() + ": Is a directory");
+    EXPECT_EQ(refusal(empty), "no element found at line 1, column 1 in " + empty);
     const std::string locked = dir.Write("locked.xml", "<a/>");
     ASSERT_EQ(::chmod(locked.c_str(), 0), 0);
-    struct Row {
-        const char* label;
-        std::string path;
-        std::string reason;
-        HRESULT code;  // S_OK: any failure
-    };
-    const Row rows[] = {
-        {"missing file", missing, "cannot open " + missing + ": No such file or directory", S_OK},
-        {"directory", dir.str(), "cannot load " + dir.str() + ": Is a directory", S_OK},
-        {"empty file", empty, "no element found at line 1, column 1 in " + empty,
-         XML_E_PARSEFAILED},
-        {"unreadable", locked, "cannot open " + locked + ": Permission denied", E_ACCESSDENIED},
-    };
-    for (const Row& row : rows) {
-        SCOPED_TRACE(row.label);
-        if (row.path == locked && ::access(locked.c_str(), R_OK) == 0) continue;  // root reads it
-        IXMLDOMDocument2Ptr doc = NewDocument();
-        EXPECT_EQ(doc->load(_variant_t(row.path)), VARIANT_FALSE);
-        const HRESULT code = doc->GetparseError()->GeterrorCode();
-        EXPECT_TRUE(row.code == S_OK ? FAILED(code) : code == row.code) << code;
-        EXPECT_EQ(ReasonOf(doc), row.reason);
+    if (::access(locked.c_str(), R_OK) == 0) {
+        std::cout << "unreadable file not tried: running as root, which reads it\n";
+        return;
     }
+    EXPECT_EQ(refusal(locked), "cannot open " + locked + ": Permission denied");
+    EXPECT_EQ(code, E_ACCESSDENIED);
 }
 
 TEST(DomLoad, UrlsNeedServerHttpRequest) {
@@ -211,26 +207,19 @@ TEST(DomLoad, EncodingsAreDetectedFromBomAndDeclaration) {
         }
         return bytes;
     };
-    const struct {
-        const char* label;
-        std::string bytes;
-        std::u16string text;
-    } rows[] = {
-        {"UTF-8", utf8, text},
-        {"UTF-8 with BOM", "\xef\xbb\xbf" + utf8, text},
-        {"UTF-16LE with BOM", utf16(false), text},
-        {"UTF-16BE with BOM", utf16(true), text},
-        {"ISO-8859-1 declared",
-         "<?xml version=\"1.0\" encoding=\"ISO-8859-1\"?><a b=\"\xe4\xf6\xfc\">\xe4\xf6\xfc</a>",
-         u"\u00e4\u00f6\u00fc"},
+    auto decoded = [](const std::string& bytes) {
+        IXMLDOMElementPtr root = Parsed(bytes)->GetdocumentElement();
+        if (!root) return std::u16string(u"no root");
+        return _bstr_t(root->getAttribute(u"b")).ToU16String() + u"|" +
+               root->Gettext().ToU16String();
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.label);
-        IXMLDOMElementPtr root = Parsed(row.bytes)->GetdocumentElement();
-        ASSERT_TRUE(root);
-        EXPECT_EQ(_bstr_t(root->getAttribute(u"b")).ToU16String(), row.text);
-        EXPECT_EQ(root->Gettext().ToU16String(), row.text);
-    }
+    EXPECT_EQ(decoded(utf8), text + u"|" + text);
+    EXPECT_EQ(decoded("\xef\xbb\xbf" + utf8), text + u"|" + text);
+    EXPECT_EQ(decoded(utf16(false)), text + u"|" + text);
+    EXPECT_EQ(decoded(utf16(true)), text + u"|" + text);
+    EXPECT_EQ(decoded("<?xml version=\"1.0\" encoding=\"ISO-8859-1\"?><a "
+                      "b=\"\xe4\xf6\xfc\">\xe4\xf6\xfc</a>"),
+              u"\u00e4\u00f6\u00fc|\u00e4\u00f6\u00fc");
     // loadXML takes its string as decoded text whatever the declaration says.
     IXMLDOMDocument2Ptr doc = NewDocument();
     ASSERT_EQ(doc->loadXML(u"<?xml version=\"1.0\" encoding=\"ISO-8859-1\"?><a>\u00e9\u20ac</a>"),
@@ -242,11 +231,10 @@ TEST(DomLoad, EncodingsAreDetectedFromBomAndDeclaration) {
 
 TEST(DomLoad, ContentBecomesNodesAsWritten) {
     IXMLDOMDocument2Ptr doc = Parsed(
-        "<?xml version=\"1.0\" encoding=\"UTF-8\" standalone=\"yes\"?>\n<!-- before --><?pi "
-        "data?>\n"
-        "<r xmlns=\"urn:x\" xmlns:p=\"urn:p\" p:a=\"1\" "
-        "b=\"2\">x&amp;y&#65;<![CDATA[<z>]]>w<!--c-->"
-        "\n  <p:e/>\n</r>");
+        "<?xml version=\"1.0\" encoding=\"UTF-8\" standalone=\"yes\"?>\n"
+        "<!-- before --><?pi data?>\n"
+        "<r xmlns=\"urn:x\" xmlns:p=\"urn:p\" p:a=\"1\" b=\"2\">"
+        "x&amp;y&#65;<![CDATA[<z>]]>w<!--c-->\n  <p:e/>\n</r>");
     EXPECT_EQ(Describe(doc->GetchildNodes()),
               "4: 7 xml=version=\"1.0\" encoding=\"UTF-8\" standalone=\"yes\"| 8 #comment= before |"
               " 7 pi=data| 1 r=null|");
@@ -288,34 +276,23 @@ TEST(DomLoad, ValidateOnParseChecksTheSchemasTheRootNames) {
     };
     std::string broken = doc("xsi", "12");
     broken.insert(broken.size() - 4, "</n>");
-    const struct {
-        const char* label;
-        std::string xml;
-        bool validate, loads;
-        const char* reason;  // expected start of the reason
-    } rows[] = {
-        {"valid", doc("xsi", "12"), true, true, ""},
-        {"invalid", doc("xsi", "twelve"), true, false, ""},
-        {"invalid, other prefix", doc("i", "twelve"), true, false, ""},
-        {"invalid, validation off", doc("xsi", "twelve"), false, true, ""},
-        {"no schema named", "<r><n>twelve</n></r>", true, true, ""},
-        {"not well-formed, schema named", broken, true, false, "mismatched tag at line 1"},
-    };
     ScratchDir dir;
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.label);
+    auto outcome = [&](const std::string& xml, bool validate) {
         IXMLDOMDocument2Ptr d = NewDocument();
-        d->PutvalidateOnParse(row.validate ? VARIANT_TRUE : VARIANT_FALSE);
-        EXPECT_EQ(d->load(_variant_t(dir.Write("doc.xml", row.xml))),
-                  row.loads ? VARIANT_TRUE : VARIANT_FALSE)
-            << ReasonOf(d);
-        if (!row.loads) {
-            EXPECT_NE(d->GetparseError()->GeterrorCode(), 0);
-            EXPECT_NE(ReasonOf(d), "");
-            EXPECT_EQ(ReasonOf(d).rfind(row.reason, 0), 0u) << ReasonOf(d);
-            EXPECT_FALSE(d->GetdocumentElement());
-        }
-    }
+        d->PutvalidateOnParse(validate ? VARIANT_TRUE : VARIANT_FALSE);
+        if (d->load(_variant_t(dir.Write("doc.xml", xml))) == VARIANT_TRUE)
+            return std::string("loaded");
+        EXPECT_NE(d->GetparseError()->GeterrorCode(), 0);
+        EXPECT_NE(ReasonOf(d), "");
+        EXPECT_FALSE(d->GetdocumentElement());
+        return ReasonOf(d);
+    };
+    EXPECT_EQ(outcome(doc("xsi", "12"), true), "loaded");
+    EXPECT_NE(outcome(doc("xsi", "twelve"), true), "loaded");
+    EXPECT_NE(outcome(doc("i", "twelve"), true), "loaded");  // whatever the prefix
+    EXPECT_EQ(outcome(doc("xsi", "twelve"), false), "loaded");
+    EXPECT_EQ(outcome("<r><n>twelve</n></r>", true), "loaded");  // no schema named
+    EXPECT_EQ(outcome(broken, true).rfind("mismatched tag at line 1", 0), 0u);
 }
 
 TEST(DomLoad, ValidateUsesAttachedSchemasOrThoseTheRootNames) {

@@ -28,25 +28,21 @@ TEST(DomNode, DocumentsAreCreatedByProgIdOrClassIdOnly) {
     EXPECT_EQ(CodeOf([&] { doc->setProperty(u"NoSuchProperty", _variant_t(1L)); }), E_INVALIDARG);
 }
 
-TEST(DomNode, EmptyPointersAndKindConversions) {
+TEST(DomNode, KindsValuesAndTheirChanges) {
     IXMLDOMNodePtr empty;
     EXPECT_EQ(CodeOf([&] { empty->GetnodeType(); }), E_POINTER);
-    IXMLDOMDocument2Ptr doc = Parsed("<a b='1'>t<!--c--></a>");
-    IXMLDOMElementPtr a = doc->GetdocumentElement();
-    IXMLDOMNodePtr text = a->GetfirstChild();
+    IXMLDOMDocument2Ptr doc = Parsed("<a b='1'>t<![CDATA[c]]><!--k--><?p d?><e>x<f>y</f></e></a>");
+    IXMLDOMElementPtr root = doc->GetdocumentElement();
+    IXMLDOMNodePtr text = root->GetfirstChild();
     EXPECT_FALSE(IXMLDOMElementPtr(text));
     EXPECT_TRUE(IXMLDOMTextPtr(text));
     EXPECT_FALSE(IXMLDOMCommentPtr(text));
-    EXPECT_TRUE(IXMLDOMCommentPtr(text->GetnextSibling()));
-    EXPECT_TRUE(IXMLDOMAttributePtr(a->getAttributeNode(u"b")));
-    EXPECT_FALSE(a->getAttributeNode(u"c"));
-    EXPECT_EQ(a->getAttribute(u"c").vt, VT_NULL);
+    EXPECT_TRUE(IXMLDOMCommentPtr(text->GetnextSibling()->GetnextSibling()));
+    EXPECT_TRUE(IXMLDOMAttributePtr(root->getAttributeNode(u"b")));
+    EXPECT_FALSE(root->getAttributeNode(u"c"));
+    EXPECT_EQ(root->getAttribute(u"c").vt, VT_NULL);
     EXPECT_TRUE(text->GetownerDocument() == doc);
-}
 
-TEST(DomNode, ValuesAndTheirChanges) {
-    IXMLDOMDocument2Ptr doc = Parsed("<a b='1'>t<![CDATA[c]]><!--k--><?p d?><e>x<f>y</f></e></a>");
-    IXMLDOMElementPtr root = doc->GetdocumentElement();
     EXPECT_EQ(Utf8Of(root->Gettext()), "tcxy");
     EXPECT_EQ(CodeOf([&] { root->PutnodeValue(_variant_t("v")); }), E_FAIL);
     IXMLDOMNodePtr node = root->GetfirstChild();
@@ -74,26 +70,19 @@ TEST(DomNode, AppendChildMovesNodesAndRefusesWhatCannotGoThere) {
     b->appendChild(d);  // d (with c) moves into b
     EXPECT_EQ(Utf8Of(a->Getxml()), "<a><b><d><c/></d></b></a>");
 
-    IXMLDOMNodePtr text = doc->createTextNode(u"t");
-    const struct {
-        const char* label;
-        IXMLDOMNodePtr parent, child;
-        HRESULT expected;
-    } rows[] = {
-        {"empty child", a, nullptr, E_POINTER},
-        {"other document", a, Parsed("<x/>")->GetdocumentElement(), E_INVALIDARG},
-        {"itself", b, b, E_INVALIDARG},
-        {"its ancestor", c, a, E_INVALIDARG},
-        {"attribute", a, doc->createAttribute(u"z"), E_INVALIDARG},
-        {"document", a, doc, E_INVALIDARG},
-        {"under text", text, doc->createElement(u"e"), E_INVALIDARG},
-        {"text under document", doc, text, E_INVALIDARG},
-        {"second root", doc, doc->createElement(u"e"), E_INVALIDARG},
+    auto append = [](const IXMLDOMNodePtr& parent, const IXMLDOMNodePtr& child) {
+        return CodeOf([&] { parent->appendChild(child); });
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.label);
-        EXPECT_EQ(CodeOf([&] { row.parent->appendChild(row.child); }), row.expected);
-    }
+    IXMLDOMNodePtr text = doc->createTextNode(u"t");
+    EXPECT_EQ(append(a, nullptr), E_POINTER);
+    EXPECT_EQ(append(a, Parsed("<x/>")->GetdocumentElement()), E_INVALIDARG);  // other document
+    EXPECT_EQ(append(b, b), E_INVALIDARG);
+    EXPECT_EQ(append(c, a), E_INVALIDARG);  // its ancestor
+    EXPECT_EQ(append(a, doc->createAttribute(u"z")), E_INVALIDARG);
+    EXPECT_EQ(append(a, doc), E_INVALIDARG);
+    EXPECT_EQ(append(text, doc->createElement(u"e")), E_INVALIDARG);
+    EXPECT_EQ(append(doc, text), E_INVALIDARG);
+    EXPECT_EQ(append(doc, doc->createElement(u"e")), E_INVALIDARG);  // a second root
     EXPECT_EQ(Utf8Of(a->Getxml()), "<a><b><d><c/></d></b></a>");
 }
 
@@ -140,23 +129,16 @@ TEST(DomNode, AttributeMapsAddReplaceAndRemove) {
     r->setAttribute(u"e", _variant_t("5"));
     EXPECT_EQ(Utf8Of(r->Getxml()), "<r b=\"two\" c=\"7\" d=\"\" e=\"5\"/>");
 
-    const struct {
-        const char* label;
-        IXMLDOMNamedNodeMapPtr map;
-        IXMLDOMNodePtr node;
-    } rows[] = {
-        {"not an attribute", map, doc->createElement(u"x")},
-        {"other document", map, NewDocument()->createAttribute(u"x")},
-        {"attached elsewhere", map,
-         Parsed("<q z='1'/>")->GetdocumentElement()->getAttributeNode(u"z")},
-        {"attached here, set on another element", doc->createElement(u"s")->Getattributes(),
-         map->getNamedItem(u"b")},
+    auto set = [](const IXMLDOMNamedNodeMapPtr& on, const IXMLDOMNodePtr& node) {
+        return CodeOf([&] { on->setNamedItem(node); });
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.label);
-        EXPECT_EQ(CodeOf([&] { row.map->setNamedItem(row.node); }), E_INVALIDARG);
-    }
-    EXPECT_EQ(CodeOf([&] { map->setNamedItem(nullptr); }), E_POINTER);
+    EXPECT_EQ(set(map, nullptr), E_POINTER);
+    EXPECT_EQ(set(map, doc->createElement(u"x")), E_INVALIDARG);
+    EXPECT_EQ(set(map, NewDocument()->createAttribute(u"x")), E_INVALIDARG);
+    EXPECT_EQ(set(map, Parsed("<q z='1'/>")->GetdocumentElement()->getAttributeNode(u"z")),
+              E_INVALIDARG);  // attached in another document
+    EXPECT_EQ(set(doc->createElement(u"s")->Getattributes(), map->getNamedItem(u"b")),
+              E_INVALIDARG);  // attached here, to another element
 }
 
 TEST(DomNode, CreateNodeMakesEachKind) {
