@@ -146,9 +146,23 @@ void AppendInt(TextBuilder& out, long long value) {
     out.AppendAscii(buffer, result.ptr);
 }
 
+// "%.15g" leaves the '.' out of numbers such as 1e-005 or 100000000000000, and the reader takes
+// a token without '.' for an integer: 1e-005 would come back as 1, 1e+015 as 1 and 1e14 as
+// 2147483647. A ".0" in front of the exponent (or at the end) keeps such a double a double.
+// Whole numbers within the integer range read back as the same number and keep their text.
+char* KeepReadableAsDouble(char* first, char* last, double value) {
+    if (std::find(first, last, '.') != last || !std::isfinite(value)) return last;
+    char* exponent = std::find(first, last, 'e');
+    if (exponent == last && value >= -2147483648.0 && value <= 2147483647.0) return last;
+    std::memmove(exponent + 2, exponent, static_cast<std::size_t>(last - exponent));
+    exponent[0] = '.';
+    exponent[1] = '0';
+    return last + 2;
+}
+
 void AppendDouble(TextBuilder& out, double value) {
-    char buffer[kDoubleTextCapacity];
-    out.AppendAscii(buffer, FormatDouble(value, buffer));
+    char buffer[kDoubleTextCapacity + 2];
+    out.AppendAscii(buffer, KeepReadableAsDouble(buffer, FormatDouble(value, buffer), value));
 }
 
 // The platform's text of a value; the empty text when it has none.

@@ -110,7 +110,9 @@ void PutQuotedStrings(std::u16string_view text, VARIANT& array);
 /// With `quoteStrings` (format type "STRING") a string element without any double quote in it
 /// is written between double quotes: the reader takes strings only from between quotes, so
 /// unquoted strings would not survive being read back. A string holding a quote is written as
-/// it stands.
+/// it stands. A double is written with "%.15g"; where that text has no '.' and would read back
+/// as another number (an exponent form such as 1e-005, or a whole number beyond the 32-bit
+/// range), ".0" goes before the exponent or at the end (1.0e-005).
 _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings);
 
 /// atoi in the C locale over [first, last): white space skipped, optional sign, decimal

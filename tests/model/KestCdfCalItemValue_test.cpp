@@ -120,7 +120,7 @@ TEST(KestCdfCalItemValue, StoresTextByFormatTypeAndOriginAndWritesItBack) {
         {true, u"NUMERIC", u"1e5 2", {R8(1e5), I4(2)}, u"100000 2"},
         {true, u"NUMERIC", u"2 1e5 3.5e-7", {R8(2), I4(1), R8(3.5e-7)}, u"2 1 3.5e-007"},
         {true, u"NUMERIC", u"1e20 -9999999999", {R8(1e20), I4(INT_MIN)},
-         u"1e+020 -2147483648"},
+         u"1.0e+020 -2147483648"},
         {true, u"NUMERIC", u"0.1 x 0.30000000000000004", {R8(0.1), I4(0), R8(0.30000000000000004)},
          u"0.1 0 0.3"},
         {true, u"NUMERIC", u"1.5 2,5", {R8(1.5), I4(2)}, u"1.5 2"},
@@ -169,7 +169,7 @@ TEST(KestCdfCalItemValue, StoresNumbersGivenByTheHost) {
         {true, u"NUMERIC", _variant_t(0.1f), {R8(0.1)}, u"0.1"},
         {false, u"LABEL", _variant_t(2.5), {R8(2.5)}, u"2.5"},
         {false, u"STRING", _variant_t(7), {I4(7)}, u"7"},
-        {false, u"STRING", _variant_t(1e20), {R8(1e20)}, u"1e+020"},
+        {false, u"STRING", _variant_t(1e20), {R8(1e20)}, u"1.0e+020"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE((row.fromDocument ? "read " : "host ") + Narrow(row.format));
@@ -327,4 +327,27 @@ TEST(KestCdfCalItemValue, LongAndOverflowingTokens) {
     value.SetValue(_variant_t(u"0." + std::u16string(300, u'0') + u"5 " + digits + u" -" +
                               digits + u" 0" + digits + u".0"));
     ExpectElements(value.GetValue(), {R8(5e-301), I4(INT_MAX), I4(INT_MIN), R8(std::numeric_limits<double>::infinity())});
+}
+
+TEST(KestCdfCalItemValue, EveryValueSurvivesAWriteAndARead) {
+    // Doubles whose "%.15g" text has no '.' and strings would otherwise read back changed:
+    // 1e-005 as the integer 1, 1e14 as 2147483647, unquoted strings as one element or none.
+    struct Row {
+        const char* xml;
+        std::vector<Element> elements;
+    } rows[] = {
+        {"<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">0.5 0.00001 1.0e20 100000000000000.0"
+         " 123456789012345.0 -3.0e9</VALUE>",
+         {R8(0.5), R8(1e-5), R8(1e20), R8(1e14), R8(123456789012345.0), R8(-3e9)}},
+        {"<VALUE sw-units-ref=\"\" format-type=\"STRING\">\"OFF\" \"a b\" \"\"</VALUE>",
+         {Str(u"OFF"), Str(u"a b"), Str(u"")}},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.xml);
+        KestCdfCalItemValue first = ReadValue(row.xml);
+        ExpectElements(first.GetValue(), row.elements);
+        IXMLDOMDocument2Ptr doc;
+        KestCdfCalItemValue second = ReadValue(WriteValue(first, doc)->Getxml().ToString());
+        ExpectElements(second.GetValue(), row.elements);
+    }
 }

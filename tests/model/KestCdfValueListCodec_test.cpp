@@ -421,10 +421,10 @@ TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
 
     _variant_t axis = FormatValueList(array, ElementWriting::kAxis, false);
     ASSERT_EQ(VT_BSTR, axis.vt);
-    EXPECT_EQ(u"1e+020 0.100000001490116 -42 a b 0 7 -1",
+    EXPECT_EQ(u"1.0e+020 0.100000001490116 -42 a b 0 7 -1",
               std::u16string(BstrView(axis.bstrVal)));
     _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue, false);
-    EXPECT_EQ(u"1e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
+    EXPECT_EQ(u"1.0e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
 }
 
 TEST(KestCdfValueListCodec, LongListsAreWrittenAndReadWhole) {
