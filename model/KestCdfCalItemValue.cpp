@@ -1,5 +1,6 @@
 #include "KestCdfCalItemValue.h"
 
+#include <string_view>
 #include <utility>
 
 #include "../core/KestCalmorphDLLError.h"
@@ -154,11 +155,15 @@ bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent,
 
     // The element stays attached with its attributes when there is nothing to write.
     if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
-    const _variant_t text = GetNumbersFromSafeArray(m_value);
-    IXMLDOMNodePtr textNode =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), NoName(), NoName());
-    textNode->PutnodeValue(text);
-    element->appendChild(textNode);
+    // GetNumbersFromSafeArray's text, built as UTF-8 since that is how the DOM keeps it.
+    detail::FormatValueListUtf8(
+        m_value, detail::ElementWriting::kCalItemValue,
+        detail::IsFormatType(m_formatType, detail::kFormatString), [&](std::string_view text) {
+            IXMLDOMNodePtr textNode =
+                doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), NoName(), NoName());
+            textNode->PutnodeValueUtf8(text);
+            element->appendChild(textNode);
+        });
     return true;
 }
 

@@ -13,6 +13,7 @@
 #include <stdlib.h>
 #include <string>
 #include <system_error>
+#include <type_traits>
 
 namespace kest {
 namespace detail {
@@ -87,6 +88,9 @@ private:
 
 // Collects a value text: in the object itself while it is short, which most values are, so
 // that writing a file does not allocate per value; on the heap, growing geometrically, beyond.
+// One builder for both encodings, so the UTF-8 text the writers store and the UTF-16 text of
+// GetNumbersFromSafeArray come from the same rules: everything but string elements is ASCII.
+template <class Char>
 class TextBuilder {
 public:
     TextBuilder() noexcept = default;
@@ -94,28 +98,66 @@ public:
     TextBuilder& operator=(const TextBuilder&) = delete;
 
     // Room for `extra` more units at the end; throws _com_error(E_OUTOFMEMORY).
-    char16_t* Reserve(std::size_t extra) {
+    Char* Reserve(std::size_t extra) {
         if (static_cast<std::size_t>(m_limit - m_end) < extra) Grow(extra);
         return m_end;
     }
 
-    void Push(char16_t c) {
-        char16_t* p = Reserve(1);
-        *p = c;
+    void Push(char c) {
+        Char* p = Reserve(1);
+        *p = static_cast<Char>(c);
         m_end = p + 1;
     }
+    // UTF-16 text, in this builder's encoding. Unpaired surrogates become U+FFFD in UTF-8, as
+    // Utf16ToUtf8 has them; the elements' texts are converted one by one, which gives the
+    // conversion of the whole text because a separator or quote (never a surrogate) stands
+    // between any two of them.
     void Append(std::u16string_view text) {
-        char16_t* p = Reserve(text.size());
-        if (!text.empty()) std::memcpy(p, text.data(), text.size() * sizeof(char16_t));
-        m_end = p + text.size();
+        if constexpr (std::is_same<Char, char16_t>::value) {
+            char16_t* p = Reserve(text.size());
+            if (!text.empty()) std::memcpy(p, text.data(), text.size() * sizeof(char16_t));
+            m_end = p + text.size();
+        } else {
+            // At most three bytes per unit (a pair of units takes four).
+            if (text.size() > SIZE_MAX / 3) throw _com_error(E_OUTOFMEMORY);
+            char* o = Reserve(3 * text.size());
+            const char16_t* p = text.data();
+            const char16_t* const end = p + text.size();
+            while (p < end) {
+                std::uint32_t code = *p++;
+                if (code < 0x80) {
+                    *o++ = static_cast<char>(code);
+                    continue;
+                }
+                if (code >= 0xD800 && code <= 0xDFFF) {
+                    if (code <= 0xDBFF && p < end && *p >= 0xDC00 && *p <= 0xDFFF) {
+                        code = 0x10000 + ((code - 0xD800) << 10) + (*p++ - 0xDC00u);
+                        *o++ = static_cast<char>(0xF0 | (code >> 18));
+                        *o++ = static_cast<char>(0x80 | ((code >> 12) & 0x3F));
+                        *o++ = static_cast<char>(0x80 | ((code >> 6) & 0x3F));
+                        *o++ = static_cast<char>(0x80 | (code & 0x3F));
+                        continue;
+                    }
+                    code = 0xFFFD;
+                }
+                if (code < 0x800) {
+                    *o++ = static_cast<char>(0xC0 | (code >> 6));
+                } else {
+                    *o++ = static_cast<char>(0xE0 | (code >> 12));
+                    *o++ = static_cast<char>(0x80 | ((code >> 6) & 0x3F));
+                }
+                *o++ = static_cast<char>(0x80 | (code & 0x3F));
+            }
+            m_end = o;
+        }
     }
     void AppendAscii(const char* first, const char* last) {
-        char16_t* p = Reserve(static_cast<std::size_t>(last - first));
-        while (first != last) *p++ = static_cast<char16_t>(*first++);
+        Char* p = Reserve(static_cast<std::size_t>(last - first));
+        while (first != last) *p++ = static_cast<Char>(*first++);
         m_end = p;
     }
 
-    const char16_t* data() const noexcept { return m_begin; }
+    const Char* data() const noexcept { return m_begin; }
     std::size_t size() const noexcept { return static_cast<std::size_t>(m_end - m_begin); }
 
 private:
@@ -123,24 +165,25 @@ private:
         const std::size_t used = size();
         const std::size_t capacity =
             std::max(2 * static_cast<std::size_t>(m_limit - m_begin), used + extra);
-        char16_t* grown = new (std::nothrow) char16_t[capacity];
+        Char* grown = new (std::nothrow) Char[capacity];
         if (!grown) throw _com_error(E_OUTOFMEMORY);
-        std::memcpy(grown, m_begin, used * sizeof(char16_t));
+        std::memcpy(grown, m_begin, used * sizeof(Char));
         m_heap.reset(grown);
         m_begin = grown;
         m_end = grown + used;
         m_limit = grown + capacity;
     }
 
-    static constexpr std::size_t kLocalUnits = 2048;
-    char16_t m_local[kLocalUnits];
-    std::unique_ptr<char16_t[]> m_heap;
-    char16_t* m_begin = m_local;
-    char16_t* m_end = m_local;
-    char16_t* m_limit = m_local + kLocalUnits;
+    static constexpr std::size_t kLocalUnits = 4096 / sizeof(Char);
+    Char m_local[kLocalUnits];
+    std::unique_ptr<Char[]> m_heap;
+    Char* m_begin = m_local;
+    Char* m_end = m_local;
+    Char* m_limit = m_local + kLocalUnits;
 };
 
-void AppendInt(TextBuilder& out, long long value) {
+template <class Char>
+void AppendInt(TextBuilder<Char>& out, long long value) {
     char buffer[24];
     auto result = std::to_chars(buffer, buffer + sizeof buffer, value);
     out.AppendAscii(buffer, result.ptr);
@@ -160,13 +203,15 @@ char* KeepReadableAsDouble(char* first, char* last, double value) {
     return last + 2;
 }
 
-void AppendDouble(TextBuilder& out, double value) {
+template <class Char>
+void AppendDouble(TextBuilder<Char>& out, double value) {
     char buffer[kDoubleTextCapacity + 2];
     out.AppendAscii(buffer, KeepReadableAsDouble(buffer, FormatDouble(value, buffer), value));
 }
 
 // The platform's text of a value; the empty text when it has none.
-void AppendPlatformText(TextBuilder& out, const VARIANT& value) {
+template <class Char>
+void AppendPlatformText(TextBuilder<Char>& out, const VARIANT& value) {
     VARIANT text;
     VariantInit(&text);
     if (SUCCEEDED(VariantChangeType(&text, &value, 0, VT_BSTR))) {
@@ -180,7 +225,8 @@ void AppendPlatformText(TextBuilder& out, const VARIANT& value) {
     VariantClear(&text);
 }
 
-void AppendElement(TextBuilder& out, const VARIANT& element, ElementWriting writing,
+template <class Char>
+void AppendElement(TextBuilder<Char>& out, const VARIANT& element, ElementWriting writing,
                    bool quoteStrings) {
     switch (element.vt) {
     case VT_BSTR: {
@@ -188,9 +234,9 @@ void AppendElement(TextBuilder& out, const VARIANT& element, ElementWriting writ
         // A string that holds a quote cannot be quoted faithfully (there is no escape); it is
         // written as it stands, which also keeps a host's pre-quoted text unchanged.
         const bool quote = quoteStrings && text.find(u'"') == std::u16string_view::npos;
-        if (quote) out.Push(u'"');
+        if (quote) out.Push('"');
         out.Append(text);
-        if (quote) out.Push(u'"');
+        if (quote) out.Push('"');
         return;
     }
     case VT_R8:
@@ -368,8 +414,11 @@ void PutQuotedStrings(std::u16string_view text, VARIANT& array) {
     }
 }
 
-_variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings) {
-    TextBuilder out;
+namespace {
+
+template <class Char>
+void BuildValueList(TextBuilder<Char>& out, const VARIANT& stored, ElementWriting writing,
+                    bool quoteStrings) {
     if (stored.vt == kArrayOfVariants && stored.parray) {
         SAFEARRAY* array = stored.parray;
         const long long n = array->rgsabound[0].cElements;
@@ -379,9 +428,16 @@ _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool q
             // Index i is fetched as an element index; one outside the bounds adds nothing.
             if (i < lowerBound || i - lowerBound >= n) continue;
             AppendElement(out, data.get()[i - lowerBound], writing, quoteStrings);
-            if (i < n - 1) out.Push(u' ');
+            if (i < n - 1) out.Push(' ');
         }
     }
+}
+
+}  // namespace
+
+_variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings) {
+    TextBuilder<char16_t> out;
+    BuildValueList(out, stored, writing, quoteStrings);
     if (out.size() > UINT_MAX / sizeof(OLECHAR)) throw _com_error(E_OUTOFMEMORY);
     BSTR text = SysAllocStringLen(out.data(), static_cast<UINT>(out.size()));
     if (!text) throw _com_error(E_OUTOFMEMORY);
@@ -389,6 +445,13 @@ _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool q
     result.vt = VT_BSTR;
     result.bstrVal = text;
     return result;
+}
+
+void FormatValueListUtf8(const VARIANT& stored, ElementWriting writing, bool quoteStrings,
+                         const std::function<void(std::string_view)>& consume) {
+    TextBuilder<char> out;
+    BuildValueList(out, stored, writing, quoteStrings);
+    consume(std::string_view(out.data(), out.size()));
 }
 
 int ParseInt(const char* first, const char* last) noexcept {

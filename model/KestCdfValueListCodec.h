@@ -7,6 +7,7 @@
 // separator whatever the host sets).
 
 #include <cstddef>
+#include <functional>
 #include <string_view>
 
 #include "../platform/Automation.h"
@@ -114,6 +115,12 @@ void PutQuotedStrings(std::u16string_view text, VARIANT& array);
 /// as another number (an exponent form such as 1e-005, or a whole number beyond the 32-bit
 /// range), ".0" goes before the exponent or at the end (1.0e-005).
 _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool quoteStrings);
+
+/// FormatValueList's text, byte for byte its UTF-8 form, handed to `consume` (valid for the
+/// call only) without a detour through UTF-16: what the writers store in the DOM, which keeps
+/// text as UTF-8. Throws _com_error when memory runs out.
+void FormatValueListUtf8(const VARIANT& stored, ElementWriting writing, bool quoteStrings,
+                         const std::function<void(std::string_view)>& consume);
 
 /// atoi in the C locale over [first, last): white space skipped, optional sign, decimal
 /// digits, stopping at the first other character; 0 when there is no number. Values outside

@@ -79,6 +79,33 @@ void IXMLDOMNode::PutnodeValue(const _variant_t& value) {
     }
 }
 
+bool IXMLDOMNode::GetnodeValueUtf8(std::string_view& text) const {
+    switch (m_node->Type()) {
+        case NODE_ATTRIBUTE:
+        case NODE_TEXT:
+        case NODE_CDATA_SECTION:
+        case NODE_COMMENT:
+            text = m_node->Text();
+            return true;
+        case NODE_PROCESSING_INSTRUCTION:
+            if (m_node->IsDeclaration()) return false;  // no stored text to lend
+            text = m_node->Text();
+            return true;
+        default:
+            return false;
+    }
+}
+
+void IXMLDOMNode::PutnodeValueUtf8(std::string_view utf8) {
+    if (m_node->Type() == NODE_ELEMENT || m_node->Type() == NODE_DOCUMENT)
+        throw _com_error(E_FAIL, "elements and documents have no value of their own");
+    if (m_node->IsDeclaration()) {
+        detail::SetDeclarationText(*m_doc, m_node, utf8);
+    } else {
+        m_doc->SetText(m_node, utf8);
+    }
+}
+
 _bstr_t IXMLDOMNode::GetnamespaceURI() const {
     const detail::DomName* name = m_node->name;
     return name && name->created ? ToBstr(name->namespaceURI) : _bstr_t(u"");

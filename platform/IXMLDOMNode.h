@@ -8,6 +8,7 @@
 // processing off, so `xmlns` and `xmlns:p` are ordinary attributes in document order.
 
 #include <cstddef>
+#include <string_view>
 #include <type_traits>
 #include <utility>
 
@@ -156,6 +157,17 @@ public:
     _variant_t GetnodeValue() const;
     /// Sets the text (the value is converted to a string); E_FAIL for elements and documents.
     void PutnodeValue(const _variant_t& value);
+    /// Extension (no MSXML counterpart), for callers that hold text as UTF-8 already: the value
+    /// as stored, without a conversion to UTF-16. False for elements and documents (where
+    /// GetnodeValue gives VT_NULL) and for the XML declaration, whose value is composed from
+    /// its pseudo-attributes rather than stored (GetnodeValue gives it). The view stays valid
+    /// until the node's value changes or the document dies.
+    bool GetnodeValueUtf8(std::string_view& text) const;
+    /// Extension (no MSXML counterpart): PutnodeValue of a string given as UTF-8, stored
+    /// without a detour through UTF-16. Same rules: E_FAIL for elements and documents; for the
+    /// XML declaration the text is parsed as its pseudo-attributes. `utf8` must be valid UTF-8
+    /// (it is stored as it stands, not checked): pass only text produced as UTF-8.
+    void PutnodeValueUtf8(std::string_view utf8);
     /// The namespace URI the node was created in (empty for parsed nodes and for none).
     _bstr_t GetnamespaceURI() const;
     /// The text content: the node's value, or the concatenated text of an element's subtree.

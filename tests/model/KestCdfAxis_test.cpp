@@ -133,6 +133,9 @@ TEST(KestCdfAxis, SplitsTextByFormatTypeAndWritesItBack) {
         {u"STRING", u"\"a b", {}, u""},
         {u"LABEL", u"1 2 \"x\"", {Str(u"1 2 \"x\"")}, u"1 2 \"x\""},
         {u"LABEL", u"", {Str(u"")}, u""},
+        {u"STRING", u"\"\u00e9\" \"\U0001F600 \u20ac\"", {Str(u"\u00e9"), Str(u"\U0001F600 \u20ac")},
+         u"\"\u00e9\" \"\U0001F600 \u20ac\""},
+        {u"LABEL", u"\u00e9 1", {Str(u"\u00e9 1")}, u"\u00e9 1"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(Narrow(row.format) + " \"" + Narrow(row.text) + "\"");

@@ -517,3 +517,92 @@ TEST(KestCdfValueListCodec, IgnoresTheProcessLocale) {
     std::setlocale(LC_ALL, previous.c_str());
     EXPECT_EQ(u"0.25 1", std::u16string(BstrView(text.bstrVal)));
 }
+
+namespace {
+
+std::string Utf8List(const VARIANT& stored, ElementWriting writing, bool quoteStrings) {
+    std::string text;
+    FormatValueListUtf8(stored, writing, quoteStrings,
+                        [&](std::string_view utf8) { text.assign(utf8); });
+    return text;
+}
+
+_variant_t ArrayOf(const std::vector<_variant_t>& elements) {
+    _variant_t array = NewValueArray(static_cast<ULONG>(elements.size()));
+    for (LONG i = 0; i < static_cast<LONG>(elements.size()); ++i)
+        EXPECT_EQ(S_OK, SafeArrayPutElement(array.parray, &i,
+                                            const_cast<_variant_t*>(&elements[i])));
+    return array;
+}
+
+_variant_t Str(const std::u16string& text) {
+    _variant_t value;
+    value.vt = VT_BSTR;
+    value.bstrVal = SysAllocStringLen(text.data(), static_cast<UINT>(text.size()));
+    return value;
+}
+
+}  // namespace
+
+TEST(KestCdfValueListCodec, Utf8ListIsTheUtf8OfTheUtf16List) {
+    _variant_t r4;
+    r4.vt = VT_R4, r4.fltVal = 0.1f;
+    _variant_t boolean;
+    boolean.vt = VT_BOOL, boolean.boolVal = VARIANT_TRUE;
+    const std::vector<std::vector<_variant_t>> rows = {
+        {},
+        {_variant_t(1e20), _variant_t(1e-5), _variant_t(-0.0), _variant_t(3e9), _variant_t(2.5)},
+        {_variant_t(-42), r4, boolean, _variant_t(), _variant_t(static_cast<short>(7))},
+        {Str(u"plain"), Str(u"with \"quote\""), Str(u""), Str(u"\u00e9\u20ac")},
+        // A pair, lone surrogates at either end of a string, a low one first.
+        {Str(u"\U0001F600"), Str(std::u16string(1, u'\xD800')), Str(std::u16string(1, u'\xDC00')),
+         Str(std::u16string(u"a") + u'\xDBFF'), Str(std::u16string(1, u'\xDFFF') + u"b")},
+        {Str(std::u16string(5000, u'\u20ac')), _variant_t(1.5), Str(std::u16string(3000, u'x'))},
+    };
+    for (std::size_t row = 0; row < rows.size(); ++row) {
+        const _variant_t array = ArrayOf(rows[row]);
+        for (ElementWriting writing : {ElementWriting::kAxis, ElementWriting::kCalItemValue}) {
+            for (bool quote : {false, true}) {
+                SCOPED_TRACE(::testing::Message() << "row " << row << " axis "
+                                                  << (writing == ElementWriting::kAxis)
+                                                  << " quote " << quote);
+                const _variant_t utf16 = FormatValueList(array, writing, quote);
+                EXPECT_EQ(Utf8List(array, writing, quote), Utf16ToUtf8(BstrView(utf16.bstrVal)));
+            }
+        }
+    }
+    EXPECT_EQ(Utf8List(ArrayOf(rows[3]), ElementWriting::kAxis, true),
+              "\"plain\" with \"quote\" \"\" \"\xC3\xA9\xE2\x82\xAC\"");
+    EXPECT_EQ(Utf8List(_variant_t(2.5), ElementWriting::kAxis, false), "");
+}
+
+TEST(KestCdfValueListCodec, Utf8ListOfRandomStringsMatchesTheConversion) {
+    // Random units, surrogates over-represented, so that every encoding length and every
+    // unpaired position occurs; lists long enough to leave the builder's own buffer.
+    std::mt19937 random(7);
+    std::uniform_int_distribution<int> kind(0, 5);
+    for (int round = 0; round < 200; ++round) {
+        std::vector<_variant_t> elements;
+        const int count = 1 + static_cast<int>(random() % 40);
+        for (int e = 0; e < count; ++e) {
+            std::u16string text;
+            const int length = static_cast<int>(random() % (round % 10 == 0 ? 400 : 12));
+            for (int i = 0; i < length; ++i) {
+                switch (kind(random)) {
+                case 0: text += static_cast<char16_t>(0x20 + random() % 0x5f); break;
+                case 1: text += static_cast<char16_t>(0x80 + random() % 0x780); break;
+                case 2: text += static_cast<char16_t>(0x800 + random() % 0xD000); break;
+                case 3: text += static_cast<char16_t>(0xD800 + random() % 0x400); break;
+                case 4: text += static_cast<char16_t>(0xDC00 + random() % 0x400); break;
+                default: text += static_cast<char16_t>(0xE000 + random() % 0x2000); break;
+                }
+            }
+            elements.push_back(e % 3 == 2 ? _variant_t(random() / 7.0) : Str(text));
+        }
+        const _variant_t array = ArrayOf(elements);
+        SCOPED_TRACE(round);
+        const _variant_t utf16 = FormatValueList(array, ElementWriting::kCalItemValue, true);
+        ASSERT_EQ(Utf8List(array, ElementWriting::kCalItemValue, true),
+                  Utf16ToUtf8(BstrView(utf16.bstrVal)));
+    }
+}

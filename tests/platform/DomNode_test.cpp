@@ -1,6 +1,8 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <string_view>
+#include <vector>
 
 #include "DomTestUtil.h"
 #include "platform/XmlDom.h"
@@ -175,4 +177,44 @@ TEST(DomNode, CreateNodeMakesEachKind) {
         doc->createProcessingInstruction(u"xml", u"version=\"1.0\"")->Getattributes()->Getlength(),
         1);
     EXPECT_FALSE(doc->createProcessingInstruction(u"other", u"x")->Getattributes());
+}
+
+TEST(DomNode, Utf8ValuesAreTheStoredTextOfTheUtf16Ones) {
+    IXMLDOMDocument2Ptr doc =
+        Parsed("<?xml version='1.0'?><a b='\xC3\xA9'>t\xE2\x82\xAC<![CDATA[c]]><!--k--><?p d?></a>");
+    IXMLDOMElementPtr root = doc->GetdocumentElement();
+    std::string_view view;
+    EXPECT_FALSE(root->GetnodeValueUtf8(view));
+    EXPECT_FALSE(IXMLDOMNodePtr(doc)->GetnodeValueUtf8(view));
+    IXMLDOMNodePtr declaration = doc->GetfirstChild();
+    ASSERT_EQ(declaration->GetnodeType(), NODE_PROCESSING_INSTRUCTION);
+    EXPECT_FALSE(declaration->GetnodeValueUtf8(view)) << "composed, not stored";
+
+    std::vector<IXMLDOMNodePtr> holders = {root->getAttributeNode(u"b")};
+    for (IXMLDOMNodePtr n = root->GetfirstChild(); n; n = n->GetnextSibling()) holders.push_back(n);
+    ASSERT_EQ(holders.size(), 5u);
+    const std::string written = "x\xF0\x9F\x98\x80 y\xC3\xA9";  // a pair of units, and a 2-byte one
+    for (const IXMLDOMNodePtr& node : holders) {
+        SCOPED_TRACE(Utf8Of(node->GetnodeName()));
+        ASSERT_TRUE(node->GetnodeValueUtf8(view));
+        EXPECT_EQ(std::string(view), Utf8Of(_bstr_t(node->GetnodeValue())));
+        node->PutnodeValueUtf8(written);
+        EXPECT_EQ(std::u16string(BstrView(node->GetnodeValue().bstrVal)), Utf8ToUtf16(written));
+        ASSERT_TRUE(node->GetnodeValueUtf8(view));
+        EXPECT_EQ(view, written);
+        node->PutnodeValueUtf8("");
+        ASSERT_TRUE(node->GetnodeValueUtf8(view));
+        EXPECT_TRUE(view.empty());
+    }
+    // A view outlives changes of other nodes' values.
+    holders[0]->PutnodeValueUtf8("kept");
+    ASSERT_TRUE(holders[0]->GetnodeValueUtf8(view));
+    for (int i = 0; i < 1000; ++i) holders[1]->PutnodeValueUtf8(std::string(100, 'z'));
+    EXPECT_EQ(view, "kept");
+
+    EXPECT_EQ(CodeOf([&] { root->PutnodeValueUtf8("v"); }), E_FAIL);
+    EXPECT_EQ(CodeOf([&] { IXMLDOMNodePtr(doc)->PutnodeValueUtf8("v"); }), E_FAIL);
+    declaration->PutnodeValueUtf8("version=\"1.0\" encoding=\"UTF-8\"");
+    EXPECT_EQ(Utf8Of(_bstr_t(declaration->GetnodeValue())), "version=\"1.0\" encoding=\"UTF-8\"");
+    EXPECT_NE(CodeOf([&] { declaration->PutnodeValueUtf8("no pseudo-attributes"); }), S_OK);
 }
