@@ -162,6 +162,17 @@ bool KestCdfAxis::ConvertAxisNode(IXMLDOMNodePtr node) {
     IXMLDOMNodeListPtr children = node->GetchildNodes();
     // Every child replaces the value, so the last one decides.
     for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
+        // Numbers are parsed from the text as the DOM stores it: SetAxisValue's result for the
+        // text, without making a BSTR of it first.
+        std::string_view utf8;
+        if (detail::IsFormatType(m_formatType, detail::kFormatNumeric) &&
+            child->GetnodeValueUtf8(utf8)) {
+            _variant_t array =
+                detail::NewValueArray(static_cast<ULONG>(detail::CountValues(true, utf8)));
+            detail::FillNumbersUtf8(utf8, detail::NumberTyping::kWholeText, array);
+            m_value = std::move(array);
+            continue;
+        }
         _variant_t text = child->GetnodeValue();
         if (text.vt != VT_BSTR) text.ChangeType(VT_BSTR);
         SetAxisValue(std::move(text));

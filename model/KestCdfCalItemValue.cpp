@@ -120,6 +120,17 @@ bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {
     // Every child replaces the value, so the last one decides.
     for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
         m_fromDocument = 1;
+        // Numbers are parsed from the text as the DOM stores it: SetValue's result for the
+        // text, without making a BSTR of it first.
+        std::string_view utf8;
+        if (detail::IsFormatType(m_formatType, detail::kFormatNumeric) &&
+            child->GetnodeValueUtf8(utf8)) {
+            _variant_t array =
+                detail::NewValueArray(static_cast<ULONG>(detail::CountValues(true, utf8)));
+            detail::FillNumbersUtf8(utf8, detail::NumberTyping::kPerToken, array);
+            m_value = std::move(array);
+            continue;
+        }
         SetValue(child->GetnodeValue());
     }
     return true;

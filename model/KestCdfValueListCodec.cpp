@@ -292,13 +292,24 @@ bool IsFormatType(const KestCdfNormalizedString& formatType, std::u16string_view
     return BstrView(formatType.m_string.m_str) == keyword;
 }
 
-int CountValues(bool numeric, std::u16string_view text) noexcept {
+namespace {
+
+template <class Char>
+int CountSpaces(bool numeric, std::basic_string_view<Char> text) noexcept {
     if (!numeric) return 0;
     std::size_t spaces = 0;
-    for (char16_t c : text) spaces += c == u' ';  // branch-free, so that it vectorises
+    for (Char c : text) spaces += c == Char(' ');  // branch-free, so that it vectorises
     // A BSTR is at most 2^31 units long, but keep the count in range whatever the view.
     return spaces >= static_cast<std::size_t>(INT_MAX) ? INT_MAX : static_cast<int>(spaces + 1);
 }
+
+}  // namespace
+
+int CountValues(bool numeric, std::u16string_view text) noexcept {
+    return CountSpaces(numeric, text);
+}
+
+int CountValues(bool numeric, std::string_view utf8) noexcept { return CountSpaces(numeric, utf8); }
 
 _variant_t NewValueArray(ULONG count) {
     SAFEARRAY* array = SafeArrayCreateVector(VT_VARIANT, 0, count);
@@ -315,6 +326,18 @@ _variant_t SingleValueArray(const VARIANT& value) {
     ThrowIfFailed(SafeArrayPutElement(result.parray, &index, &value));
     return result;
 }
+
+namespace {
+
+// The tokenizer over narrow text: one byte per UTF-16 unit, or UTF-8 as stored. Either way a
+// byte outside ASCII is no white space, digit, sign, letter, '.' or space to any rule here or
+// in the C library's parser (C locale), so it ends a number wherever it stands, as the
+// placeholder of a narrowed unit does: a character is never part of a number, whatever the
+// number of bytes it takes.
+void FillNarrow(const char* const base, const std::size_t length, NumberTyping typing,
+                VARIANT& array, ULONG count);
+
+}  // namespace
 
 void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) {
     CheckArray(array);
@@ -333,8 +356,20 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
         narrow = large.get();
     }
     Narrow(text, narrow);
-    const char* const base = narrow;
+    FillNarrow(narrow, length, typing, array, count);
+}
 
+void FillNumbersUtf8(std::string_view utf8, NumberTyping typing, VARIANT& array) {
+    CheckArray(array);
+    const ULONG count = array.parray->rgsabound[0].cElements;
+    if (count == 0) return;
+    FillNarrow(utf8.data(), utf8.size(), typing, array, count);
+}
+
+namespace {
+
+void FillNarrow(const char* const base, const std::size_t length, NumberTyping typing,
+                VARIANT& array, ULONG count) {
     ArrayData data(array.parray);
     VARIANT* const elements = data.get();
     const bool wholeTextDouble =
@@ -374,6 +409,8 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
     }
     store(start, length);
 }
+
+}  // namespace
 
 bool IsQuoted(std::u16string_view text) noexcept {
     return !text.empty() && text.front() == u'"' && text.back() == u'"';

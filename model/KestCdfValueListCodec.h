@@ -81,6 +81,9 @@ private:
 /// spaces plus 1 (1 for a text without spaces, the empty text included).
 int CountValues(bool numeric, std::u16string_view text) noexcept;
 
+/// CountValues of a text given as UTF-8 (spaces are single bytes: the same count).
+int CountValues(bool numeric, std::string_view utf8) noexcept;
+
 /// New VT_ARRAY|VT_VARIANT value of `count` VT_EMPTY elements, lower bound 0. Throws
 /// _com_error(E_OUTOFMEMORY) when the array cannot be allocated.
 _variant_t NewValueArray(ULONG count);
@@ -94,6 +97,10 @@ _variant_t SingleValueArray(const VARIANT& value);
 /// elements no token reaches stay VT_EMPTY. Throws _com_error(E_INVALIDARG) when `array` is
 /// no array of VARIANTs.
 void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array);
+
+/// FillNumbers of a text given as UTF-8 (the text's stored form in the DOM): the same elements
+/// as FillNumbers of its UTF-16 form, without converting it.
+void FillNumbersUtf8(std::string_view utf8, NumberTyping typing, VARIANT& array);
 
 /// True when the text's first and last characters are both a double quote (a text of one
 /// double quote counts; the empty text does not).

@@ -354,3 +354,37 @@ TEST(KestCdfCalItemValue, EveryValueSurvivesAWriteAndARead) {
         ExpectElements(second.GetValue(), row.elements);
     }
 }
+
+TEST(KestCdfCalItemValue, NumericTextReadFromTheDocumentIsSplitAsSetValueSplitsIt) {
+    for (const std::u16string& text : std::vector<std::u16string>{
+             u"", u" ", u"\u00e9", u"\U0001F600", u"7", u" 1 2", u"1 2.5 3", u"1\u00e9 2 \u20ac.5",
+          u"\t3 4\n", u"1e5 2 3.5e-7", std::u16string(400, u'9') + u" 0.25"}) {
+        SCOPED_TRACE(Narrow(text));
+        IXMLDOMDocument2Ptr doc = LoadDocument("<VALUE sw-units-ref=\"u\" format-type=\"NUMERIC\"/>");
+        IXMLDOMNodePtr element = doc->GetdocumentElement();
+        IXMLDOMNodePtr child =
+            doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
+        child->PutnodeValue(_variant_t(text));
+        element->appendChild(child);
+        KestCdfCalItemValue read;
+        ASSERT_TRUE(read.ConvertCalItemValueNode(element));
+
+        KestCdfCalItemValue expected = MakeValue(true, u"NUMERIC");
+        expected.SetValue(_variant_t(text));
+        const _variant_t want = expected.GetValue();
+        const _variant_t got = read.GetValue();
+        ASSERT_EQ(want.vt, got.vt);
+        ASSERT_EQ(want.parray->rgsabound[0].cElements, got.parray->rgsabound[0].cElements);
+        for (LONG i = 0; i < static_cast<LONG>(want.parray->rgsabound[0].cElements); ++i) {
+            _variant_t a, b;
+            ASSERT_EQ(S_OK, SafeArrayGetElement(want.parray, &i, &a));
+            ASSERT_EQ(S_OK, SafeArrayGetElement(got.parray, &i, &b));
+            ASSERT_EQ(a.vt, b.vt) << i;
+            if (a.vt == VT_R8) {
+                EXPECT_EQ(a.dblVal, b.dblVal) << i;
+            } else if (a.vt == VT_I4) {
+                EXPECT_EQ(a.lVal, b.lVal) << i;
+            }
+        }
+    }
+}

@@ -606,3 +606,43 @@ TEST(KestCdfValueListCodec, Utf8ListOfRandomStringsMatchesTheConversion) {
                   Utf16ToUtf8(BstrView(utf16.bstrVal)));
     }
 }
+
+TEST(KestCdfValueListCodec, NumbersFromUtf8AreThoseFromUtf16) {
+    const std::u16string longDigits = u"1." + std::u16string(300, u'0') + u"1";
+    const std::vector<std::u16string> texts = {
+        u"", u" ", u"  ", u"1", u"1 2.5 3", u" 1 2", u"1 2 ", u"1  2", u"1\t2 3\n4",
+        u"\t5 \v6", u"\u00e9", u"\u20ac", u"\U0001F600", u"\u00e9 1", u"1\u00e9 2.5\u20ac",
+        u"\u00a05 \u00855 \u30005", u"-\u00e91 +\u00e9.5", u"1.5\U0001F600e3 7",
+        u"1e\u00e95 2", u"0x1\u00e9p3 0x\u00e9", u"inf\u00e9 nan(\u00e9) nan(a\u00e9b) in\u00e9f",
+        u"\u00e9 \u00e9 \u00e9", longDigits + u"\u00e9 " + longDigits, u"1." + longDigits,
+        std::u16string(u"1\0 2", 4), u"2147483648 -2147483649 1e400 4.9e-324",
+        std::u16string(3000, u'\u20ac') + u" 8", std::u16string(1, u'\xD800') + u"5",
+    };
+    for (const std::u16string& text : texts) {
+        const std::string utf8 = Utf16ToUtf8(text);
+        ASSERT_EQ(CountValues(true, text), CountValues(true, utf8));
+        EXPECT_EQ(0, CountValues(false, utf8));
+        for (NumberTyping typing : {NumberTyping::kWholeText, NumberTyping::kPerToken}) {
+            SCOPED_TRACE(utf8 + (typing == NumberTyping::kWholeText ? " (whole)" : " (token)"));
+            const ULONG count = static_cast<ULONG>(CountValues(true, text));
+            _variant_t fromUtf16 = NewValueArray(count);
+            FillNumbers(text, typing, fromUtf16);
+            _variant_t fromUtf8 = NewValueArray(count);
+            FillNumbersUtf8(utf8, typing, fromUtf8);
+            const std::vector<_variant_t> want = Elements(fromUtf16);
+            const std::vector<_variant_t> got = Elements(fromUtf8);
+            ASSERT_EQ(want.size(), got.size());
+            for (std::size_t i = 0; i < want.size(); ++i) {
+                SCOPED_TRACE(i);
+                ASSERT_EQ(want[i].vt, got[i].vt);
+                if (want[i].vt == VT_R8) {
+                    EXPECT_EQ(Bits(want[i].dblVal), Bits(got[i].dblVal));
+                } else if (want[i].vt == VT_I4) {
+                    EXPECT_EQ(want[i].lVal, got[i].lVal);
+                }
+            }
+        }
+    }
+    _variant_t number(1.0);
+    EXPECT_THROW(FillNumbersUtf8("1", NumberTyping::kPerToken, number), _com_error);
+}
