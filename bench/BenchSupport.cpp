@@ -5,13 +5,13 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <sys/stat.h>
+#include <time.h>
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <fstream>
 #include <stdexcept>
-#include <sys/stat.h>
-#include <time.h>
 
 namespace kest {
 namespace bench {
@@ -74,7 +74,7 @@ ExpatPassResult ExpatPass(const std::string& path) {
 }
 
 double ProcessCpuSeconds() {
-    timespec ts {};
+    timespec ts{};
     clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &ts);
     return static_cast<double>(ts.tv_sec) + 1e-9 * static_cast<double>(ts.tv_nsec);
 }

@@ -43,11 +43,11 @@ struct Lap {
 };
 
 class Stopwatch {
-public:
+  public:
     Stopwatch() : m_wall(std::chrono::steady_clock::now()), m_cpu(ProcessCpuSeconds()) {}
     Lap Stop() const { return Lap{SecondsSince(m_wall), ProcessCpuSeconds() - m_cpu}; }
 
-private:
+  private:
     std::chrono::steady_clock::time_point m_wall;
     double m_cpu;
 };

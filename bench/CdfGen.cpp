@@ -14,8 +14,9 @@ namespace {
 // A small deterministic generator, so that a seed gives the same file on every platform
 // (the standard distributions are not specified bit for bit).
 class Rng {
-public:
-    explicit Rng(std::uint64_t seed) : m_state(seed * 0x9E3779B97F4A7C15ull + 0x2545F4914F6CDD1Dull) {}
+  public:
+    explicit Rng(std::uint64_t seed)
+        : m_state(seed * 0x9E3779B97F4A7C15ull + 0x2545F4914F6CDD1Dull) {}
     std::uint64_t Next() {
         // splitmix64
         std::uint64_t z = (m_state += 0x9E3779B97F4A7C15ull);
@@ -35,13 +36,13 @@ public:
         return items[Next() % N];
     }
 
-private:
+  private:
     std::uint64_t m_state;
 };
 
 // Buffered output with the few formatting helpers the generator needs.
 class Out {
-public:
+  public:
     explicit Out(const std::string& path) : m_path(path) {
         m_file = std::fopen(path.c_str(), "wb");
         if (!m_file) Fail();
@@ -83,7 +84,7 @@ public:
         return m_written;
     }
 
-private:
+  private:
     static constexpr std::size_t kFlushAt = 1 << 20;
     void Spill() {
         if (m_buffer.size() >= kFlushAt) Flush();
@@ -143,15 +144,15 @@ std::string TinyText(Rng& rng) {
     return text;
 }
 
-const char* const kPrefixes[] = {"KF",  "KL",  "FW",   "MN",  "ZW",  "TQ",  "LAM", "ETA",
-                                 "RL",  "ML",  "DK",   "ABG", "BST", "INJ", "IGN", "THR",
+const char* const kPrefixes[] = {"KF",  "KL",  "FW",    "MN",  "ZW",  "TQ",  "LAM", "ETA",
+                                 "RL",  "ML",  "DK",    "ABG", "BST", "INJ", "IGN", "THR",
                                  "EGR", "VVT", "KNOCK", "CAT", "OIL", "FAN", "TCU", "DPF"};
-const char* const kWords[] = {"MAX",  "MIN",   "OFS",  "FAC",   "LIM",   "CORR", "BASE",
-                              "ADAPT", "FILT", "HYST", "DELAY", "GAIN",  "TGT",  "THRES",
-                              "IDLE", "WARM",  "COLD", "START", "LOAD",  "SPEED"};
-const char* const kUnits[] = {"rpm", "Nm",   "%",   "degC", "mg/stroke", "-",  "kPa",
-                              "ms",  "V",    "A",   "km/h", "lambda",    "bar", "deg CrS",
-                              "mg",  "g/s",  "s",   "Hz",   "mbar",      "K"};
+const char* const kWords[] = {"MAX",   "MIN",  "OFS",  "FAC",   "LIM",  "CORR", "BASE",
+                              "ADAPT", "FILT", "HYST", "DELAY", "GAIN", "TGT",  "THRES",
+                              "IDLE",  "WARM", "COLD", "START", "LOAD", "SPEED"};
+const char* const kUnits[] = {"rpm", "Nm",  "%", "degC", "mg/stroke", "-",   "kPa",
+                              "ms",  "V",   "A", "km/h", "lambda",    "bar", "deg CrS",
+                              "mg",  "g/s", "s", "Hz",   "mbar",      "K"};
 const char* const kAnnotations[] = {
     "Applied at end of line; do not change without release of the application group",
     "Derived from dyno run 2024/17, corrected for altitude",
@@ -165,8 +166,8 @@ const char* const kAnnotations[] = {
     "Factor applied to the injected quantity in warm-up"};
 const char* const kNotes[] = {"checked", "to be reviewed", "copied from variant B",
                               "changed for emission test", "value from supplier"};
-const char* const kLabels[] = {"MODE_NORMAL", "MODE_SPORT", "MODE_ECO", "CURVE_LINEAR",
-                               "SENSOR_TYPE_B", "OFF"};
+const char* const kLabels[] = {"MODE_NORMAL",  "MODE_SPORT",    "MODE_ECO",
+                               "CURVE_LINEAR", "SENSOR_TYPE_B", "OFF"};
 const char* const kStrings[] = {"ON", "OFF", "AUTO", "LOW", "HIGH", "NONE", "FAST", "SLOW"};
 const char* const kUsers[] = {"mbauer", "jschmidt", "a.novak", "lchen", "rgarcia"};
 const char* const kTools[] = {"CalEdit 7.2", "CalEdit 7.3", "FlashPro 2.0", "calmorph 0.1"};
@@ -183,13 +184,18 @@ struct AxisShape {
 
 AxisShape RandomAxisShape(Rng& rng) {
     switch (rng.Int(0, 5)) {
-    case 0: return {"rpm", 500.0 + 250.0 * rng.Int(0, 4), 250.0 * rng.Int(1, 4), 0, 1.0};
-    case 1: return {"%", 0.0, static_cast<double>(rng.Int(9, 16)), -1, 100.0 / 255.0};
-    case 2: return {"degC", -40.0, 10.0 + rng.Int(0, 2) * 5.0, 0, 1.0};
-    case 3: return {"Nm", 0.0, 12.5 * rng.Int(1, 4), 2, 1.0};
-    case 4: return {"kPa", 20.0, 7.5 + rng.Int(0, 3) * 2.5, 2, 1.0};
-    default:
-        return {"lambda", 717.0, static_cast<double>(rng.Int(13, 41)), 10, 1.0 / 1024.0};
+        case 0:
+            return {"rpm", 500.0 + 250.0 * rng.Int(0, 4), 250.0 * rng.Int(1, 4), 0, 1.0};
+        case 1:
+            return {"%", 0.0, static_cast<double>(rng.Int(9, 16)), -1, 100.0 / 255.0};
+        case 2:
+            return {"degC", -40.0, 10.0 + rng.Int(0, 2) * 5.0, 0, 1.0};
+        case 3:
+            return {"Nm", 0.0, 12.5 * rng.Int(1, 4), 2, 1.0};
+        case 4:
+            return {"kPa", 20.0, 7.5 + rng.Int(0, 3) * 2.5, 2, 1.0};
+        default:
+            return {"lambda", 717.0, static_cast<double>(rng.Int(13, 41)), 10, 1.0 / 1024.0};
     }
 }
 
@@ -220,7 +226,7 @@ struct ValueShape {
 };
 
 ValueShape RandomValueShape(Rng& rng) {
-    static const double kRationalFactors[] = {100.0 / 255.0, 1.0 / 3.0,    5.0 / 1023.0,
+    static const double kRationalFactors[] = {100.0 / 255.0, 1.0 / 3.0,     5.0 / 1023.0,
                                               0.1 / 0.3,     360.0 / 65535, 1.0 / 12.0,
                                               2.0 / 7.0,     10.0 / 2047.0};
     ValueShape s;
@@ -320,8 +326,7 @@ std::string Crc(Rng& rng) {
 std::string DateText(Rng& rng, int changeIndex) {
     char text[32];
     std::snprintf(text, sizeof text, "%04d-%02ld-%02ldT%02ld:%02ld:%02ld", 2022 + changeIndex / 2,
-                  rng.Int(1, 12), rng.Int(1, 28), rng.Int(6, 19), rng.Int(0, 59),
-                  rng.Int(0, 59));
+                  rng.Int(1, 12), rng.Int(1, 28), rng.Int(6, 19), rng.Int(0, 59), rng.Int(0, 59));
     return text;
 }
 
@@ -356,7 +361,8 @@ CdfGenResult GenerateCdf(const CdfGenOptions& options, const std::string& path) 
         WriteText(out, 3, indent, "DATE", DateText(rng, c));
         WriteText(out, 3, indent, "TOOL", rng.Pick(kTools));
         if (c % 2 == 0)
-            WriteText(out, 3, indent, "NOTE", "Release " + std::to_string(c + 1) + " for test fleet");
+            WriteText(out, 3, indent, "NOTE",
+                      "Release " + std::to_string(c + 1) + " for test fleet");
         WriteText(out, 3, indent, "DATA-VERSION", "1." + std::to_string(c) + ".0");
         out.Indent(2, indent);
         out << "</CHANGE>";

@@ -203,8 +203,8 @@ Lap LoadDocument(const std::string& path, IXMLDOMDocument2Ptr& doc) {
 }
 
 void BM_DomLoad(benchmark::State& state) {
-    Measure(state, "dom_load", "DOM load (validate-on-parse off)", g.plainFile, g.plainBytes,
-            2.0, [](Samples&) {
+    Measure(state, "dom_load", "DOM load (validate-on-parse off)", g.plainFile, g.plainBytes, 2.0,
+            [](Samples&) {
                 IXMLDOMDocument2Ptr doc;
                 const Lap lap = LoadDocument(g.plainFile, doc);
                 doc = nullptr;  // freeing the tree is not part of the load
@@ -227,8 +227,8 @@ void BM_DomSave(benchmark::State& state) {
         },
         &s);
     if (s.op.empty() || s.ref.size() != s.op.size()) return;
-    const Figure f = MakeFigure("DOM save vs DOM load (same document)", "DOM load", 1.0, s.op,
-                                s.ref);
+    const Figure f =
+        MakeFigure("DOM save vs DOM load (same document)", "DOM load", 1.0, s.op, s.ref);
     state.counters["ratio_vs_load"] = f.ratio;
     state.counters["ratio_vs_load_cpu"] = f.ratioCpu;
     state.counters["out_bytes"] = static_cast<double>(FileSize(g.domOut));
@@ -241,8 +241,7 @@ Lap TimedRead(const std::string& path, KestCdfCalData* keep) {
     const Stopwatch watch;
     KestCdfCalData data = converter.ConvertXMLtoCPP(CComBSTR(path), true, message);
     const Lap lap = watch.Stop();
-    if (message.Length() != 0)
-        throw std::runtime_error("read " + path + ": " + message.ToString());
+    if (message.Length() != 0) throw std::runtime_error("read " + path + ": " + message.ToString());
     if (CountItems(data) != g.items)
         throw std::runtime_error("read " + path + ": " + std::to_string(CountItems(data)) +
                                  " items instead of " + std::to_string(g.items));
@@ -251,8 +250,8 @@ Lap TimedRead(const std::string& path, KestCdfCalData* keep) {
 }
 
 void BM_ReadNoSchema(benchmark::State& state) {
-    Measure(state, "read_plain", "ConvertXMLtoCPP, file names no schema", g.plainFile,
-            g.plainBytes, 2.5, [](Samples&) { return TimedRead(g.plainFile, nullptr); });
+    Measure(state, "read_plain", "ConvertXMLtoCPP, file names no schema", g.plainFile, g.plainBytes,
+            2.5, [](Samples&) { return TimedRead(g.plainFile, nullptr); });
 }
 
 void BM_ReadValidated(benchmark::State& state) {
@@ -323,11 +322,12 @@ void PrepareFiles() {
     const std::string schema = schemaEnv && *schemaEnv ? schemaEnv : KEST_BENCH_SCHEMA;
     CopyFile(schema, g.dir + "/cdf.xsd");
 
-    std::printf("Generated %ld items (%ld values, %ld curves, %ld maps) in %d lists:\n"
-                "  %s  %llu bytes (names no schema)\n  %s  %llu bytes (names cdf.xsd)\n",
-                plain.items, plain.values, plain.curves, plain.maps, plain.lists,
-                g.plainFile.c_str(), static_cast<unsigned long long>(g.plainBytes),
-                g.schemaFile.c_str(), static_cast<unsigned long long>(g.schemaBytes));
+    std::printf(
+        "Generated %ld items (%ld values, %ld curves, %ld maps) in %d lists:\n"
+        "  %s  %llu bytes (names no schema)\n  %s  %llu bytes (names cdf.xsd)\n",
+        plain.items, plain.values, plain.curves, plain.maps, plain.lists, g.plainFile.c_str(),
+        static_cast<unsigned long long>(g.plainBytes), g.schemaFile.c_str(),
+        static_cast<unsigned long long>(g.schemaBytes));
     std::fflush(stdout);
 }
 
@@ -340,9 +340,10 @@ void RemoveFiles() {
 }
 
 void PrintSummary() {
-    std::printf("\nSummary: %ld items, %.1f MB file, %d iterations; mean wall times, ratios of "
-                "summed times\n",
-                g.items, static_cast<double>(g.plainBytes) / 1e6, g.iterations);
+    std::printf(
+        "\nSummary: %ld items, %.1f MB file, %d iterations; mean wall times, ratios of "
+        "summed times\n",
+        g.items, static_cast<double>(g.plainBytes) / 1e6, g.iterations);
     std::printf("%-48s %9s %9s %7s %7s %8s  %s\n", "measurement", "wall ms", "ref ms", "ratio",
                 "cpu", "target", "reference");
     for (const std::string& key : g_order) {
@@ -353,8 +354,8 @@ void PrintSummary() {
             std::snprintf(target, sizeof target, "<= %.1f", f.target);
             verdict = f.ratioCpu <= f.target ? "met " : "MISSED ";
         }
-        std::printf("%-48s %9.1f %9.1f %7.2f %7.2f %8s  %s%s\n", f.what.c_str(), f.opMs,
-                    f.baseMs, f.ratio, f.ratioCpu, target, verdict, f.against.c_str());
+        std::printf("%-48s %9.1f %9.1f %7.2f %7.2f %8s  %s%s\n", f.what.c_str(), f.opMs, f.baseMs,
+                    f.ratio, f.ratioCpu, target, verdict, f.against.c_str());
     }
     std::printf("(ratio: wall time; cpu: process CPU time, the one judged against the target)\n");
     std::fflush(stdout);

@@ -53,9 +53,12 @@ int main(int argc, char** argv) {
                 std::fprintf(stderr, "cdfgen: bad number for %s: %s\n", arg.c_str(), v);
                 return 2;
             }
-            if (arg == "--items") options.items = static_cast<long>(n);
-            else if (arg == "--lists") options.lists = static_cast<int>(n);
-            else options.seed = static_cast<std::uint64_t>(n);
+            if (arg == "--items")
+                options.items = static_cast<long>(n);
+            else if (arg == "--lists")
+                options.lists = static_cast<int>(n);
+            else
+                options.seed = static_cast<std::uint64_t>(n);
         } else if (arg == "--schema") {
             options.schema = true;
         } else if (arg == "--no-schema") {

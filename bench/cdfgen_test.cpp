@@ -25,7 +25,7 @@ using namespace kest::bench;
 namespace {
 
 class TempDir {
-public:
+  public:
     TempDir() {
         char pattern[] = "/tmp/kest-cdfgen-XXXXXX";
         const char* made = mkdtemp(pattern);
@@ -41,7 +41,7 @@ public:
     }
     bool ok() const { return !m_path.empty(); }
 
-private:
+  private:
     std::string m_path;
     std::vector<std::string> m_files;
 };

@@ -43,7 +43,7 @@ long ResidentKb() {
 }
 
 long MaxRssKb() {
-    rusage usage {};
+    rusage usage{};
     getrusage(RUSAGE_SELF, &usage);
     return usage.ru_maxrss;  // kilobytes on Linux
 }
@@ -51,9 +51,7 @@ long MaxRssKb() {
 // Hands freed heap memory back to the system, so that the resident size before an operation
 // holds only what is in use; otherwise an operation could reuse pages that an earlier step
 // freed and its growth would not show.
-void ReleaseFreeMemory() {
-    malloc_trim(0);
-}
+void ReleaseFreeMemory() { malloc_trim(0); }
 
 // Resets the peak to the present resident size; false where the kernel does not allow it.
 bool ResetPeak() {
@@ -97,7 +95,8 @@ int main(int argc, char** argv) {
             IXMLDOMDocument2Ptr doc;
             ReleaseFreeMemory();
             baseline = ResidentKb();
-            if (FAILED(doc.CreateInstance(kProgIdDOMDocument40))) throw std::runtime_error("no DOM");
+            if (FAILED(doc.CreateInstance(kProgIdDOMDocument40)))
+                throw std::runtime_error("no DOM");
             doc->Putasync(VARIANT_FALSE);
             doc->PutvalidateOnParse(VARIANT_FALSE);
             if (doc->load(_variant_t(file)) != VARIANT_TRUE)
@@ -128,10 +127,11 @@ int main(int argc, char** argv) {
             return Usage();
         }
         const long extra = peak - baseline;
-        std::printf("mode=%s file_bytes=%llu baseline_kb=%ld peak_kb=%ld extra_kb=%ld ratio=%.2f%s\n",
-                    mode.c_str(), static_cast<unsigned long long>(bytes), baseline, peak, extra,
-                    static_cast<double>(extra) * 1024.0 / static_cast<double>(bytes),
-                    resetOk ? "" : " (peak could not be reset: includes the read)");
+        std::printf(
+            "mode=%s file_bytes=%llu baseline_kb=%ld peak_kb=%ld extra_kb=%ld ratio=%.2f%s\n",
+            mode.c_str(), static_cast<unsigned long long>(bytes), baseline, peak, extra,
+            static_cast<double>(extra) * 1024.0 / static_cast<double>(bytes),
+            resetOk ? "" : " (peak could not be reset: includes the read)");
     } catch (const KestCalmorphDLLError& e) {
         std::fprintf(stderr, "peakmem: KestCalmorphDLLError %d %s\n", e.GetReason(),
                      e.GetReasonString().ToString().c_str());

@@ -17,7 +17,7 @@ constexpr const OLECHAR* kCdfNamespaceURI = u"http://kest.dev/schemas/cdf/1.0";
 constexpr const char* kCdfSchemaFileName = "cdf.xsd";
 
 class KestCalmorph {
-public:
+  public:
     KestCalmorph();
     KestCalmorph(const KestCalmorph& other);
     KestCalmorph& operator=(const KestCalmorph& other);
@@ -62,7 +62,7 @@ public:
     /// followed by a plain decimal version (digits, optional fraction) of at least 4.0.
     static bool IsSupportedServerFileName(const char* fileName);
 
-private:
+  private:
     CComBSTR LoadXMLFile(CComBSTR path, IXMLDOMDocument2Ptr document, bool wantMessage);
     long VisitCalDataNodes(IXMLDOMNodePtr node);
     const OLECHAR* ConvertXMLNode(IXMLDOMNodePtr node);

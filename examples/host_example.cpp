@@ -24,7 +24,8 @@ int main(int argc, char** argv) {
                       << " items\n";
         }
         data.SetNote(CComBSTR("checked by host_example"));
-        if (!converter.ConvertCPPToXML(data, CComBSTR(argv[2]), CComBSTR("written by host_example"))) {
+        if (!converter.ConvertCPPToXML(data, CComBSTR(argv[2]),
+                                       CComBSTR("written by host_example"))) {
             return 3;
         }
     } catch (const KestCalmorphDLLError& e) {

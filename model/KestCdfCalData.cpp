@@ -6,10 +6,10 @@
 
 namespace kest {
 
+using detail::AddAttribute;
 using detail::AppendElement;
 using detail::AppendTextElement;
 using detail::ElementText;
-using detail::AddAttribute;
 
 KestCdfCalList* KestCdfCalData::CreateCalList(int count) {
     m_calLists.AllocateArray(count);

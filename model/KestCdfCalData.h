@@ -14,7 +14,7 @@
 namespace kest {
 
 class KestCdfCalData {
-public:
+  public:
     /// Empty strings, no lists (size 0), an empty change history.
     KestCdfCalData() = default;
     /// Copies share the list array and the change entries; the last copy frees what the
@@ -82,7 +82,7 @@ public:
     /// errors of the lists on; _com_error(E_POINTER) for a null document. Returns true.
     bool ConvertCalDataNodeToXML(IXMLDOMDocument* doc, CComBSTR comment);
 
-private:
+  private:
     _bstr_t GetNodeString(IXMLDOMNodePtr node);
     int CountCalList(IXMLDOMNodePtr node);
     bool SetXMLAttributes(IXMLDOMNodePtr root);

@@ -15,7 +15,7 @@
 namespace kest {
 
 class KestCdfCalItem {
-public:
+  public:
     /// Null name, annotation and note; no value, no axes, axis size 0.
     KestCdfCalItem() = default;
     /// Copies share the value object and the axis array; the last copy frees what the library
@@ -65,7 +65,7 @@ public:
     bool ConvertCalItemNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                  KestCdfNormalizedString ns);
 
-private:
+  private:
     int CountAxisNodes(IXMLDOMNodePtr node);
     void ReadChild(IXMLDOMNodePtr child, int& axisIndex);
     void WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc, const KestCdfNormalizedString& ns);

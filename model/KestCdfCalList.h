@@ -15,7 +15,7 @@
 namespace kest {
 
 class KestCdfCalList {
-public:
+  public:
     /// Null name and note, no file references, no items, item size -1 (not set).
     KestCdfCalList() = default;
     /// Copies share the file references and the item array; the last copy frees what the
@@ -63,7 +63,7 @@ public:
     bool ConvertCalListNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                  KestCdfNormalizedString ns);
 
-private:
+  private:
     int CountCalItem(IXMLDOMNodePtr node);
     void ReadChild(IXMLDOMNodePtr child, int& itemIndex);
 

@@ -12,7 +12,7 @@
 namespace kest {
 
 class KestCdfChange {
-public:
+  public:
     /// Empty strings (null) and the current local time as date.
     KestCdfChange() = default;
     KestCdfChange(const KestCdfChange& other) = default;
@@ -47,7 +47,7 @@ public:
     bool ConvertChangeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                             KestCdfNormalizedString ns);
 
-private:
+  private:
     KestCdfNormalizedString m_userName;
     KestCdfDate m_date;
     CComBSTR m_tool;

@@ -10,7 +10,7 @@
 namespace kest {
 
 class KestCdfChangeHistory {
-public:
+  public:
     /// No array, count 0.
     KestCdfChangeHistory() = default;
     /// Copies share the entry array; the last copy frees an array the library allocated.
@@ -39,7 +39,7 @@ public:
     bool ConvertChangeHistoryToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                    KestCdfNormalizedString ns);
 
-private:
+  private:
     int CountChangeNodes(IXMLDOMNodePtr node);
 
     detail::SharedChild<KestCdfChange> m_changes;

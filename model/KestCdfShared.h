@@ -19,16 +19,16 @@ namespace detail {
 
 /// One library allocation; frees it (and leaves the registry) when the last share goes.
 class SharedAllocation {
-public:
+  public:
     virtual ~SharedAllocation();
     const void* Address() const noexcept { return m_address; }
     /// Enters the allocation in the registry once, so a setter can find it.
     void Publish(const std::shared_ptr<SharedAllocation>& self);
 
-protected:
+  protected:
     explicit SharedAllocation(const void* address) noexcept : m_address(address) {}
 
-private:
+  private:
     const void* m_address;
     std::atomic<bool> m_published{false};
 };
@@ -39,7 +39,7 @@ std::shared_ptr<SharedAllocation> FindLibraryAllocation(const void* p);
 
 template <class T, bool IsArray>
 class TypedAllocation final : public SharedAllocation {
-public:
+  public:
     explicit TypedAllocation(T* p) noexcept : SharedAllocation(p), m_p(p) {}
     ~TypedAllocation() override {
         if (IsArray)
@@ -48,13 +48,13 @@ public:
             delete m_p;
     }
 
-private:
+  private:
     T* m_p;
 };
 
 template <class T>
 class SharedChild {
-public:
+  public:
     /// The pointer, for the library's own use.
     T* get() const noexcept { return m_ptr; }
 
@@ -90,7 +90,7 @@ public:
         m_ptr = p;
     }
 
-private:
+  private:
     T* m_ptr = nullptr;
     std::shared_ptr<SharedAllocation> m_owner;
 };

@@ -9,7 +9,7 @@
 namespace kest {
 
 class KestCdfSymbolicFile {
-public:
+  public:
     /// Empty file name, CRC 0.
     KestCdfSymbolicFile() = default;
     KestCdfSymbolicFile(const KestCdfSymbolicFile& other) = default;
@@ -47,7 +47,7 @@ public:
     bool ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                       KestCdfNormalizedString ns);
 
-private:
+  private:
     void SetSymbolicFileAttributes(IXMLDOMNamedNodeMapPtr attributes);
 
     KestCdfNormalizedString m_fileName;

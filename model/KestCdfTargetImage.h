@@ -9,7 +9,7 @@
 namespace kest {
 
 class KestCdfTargetImage {
-public:
+  public:
     /// Empty file name, CRC 0.
     KestCdfTargetImage() = default;
     KestCdfTargetImage(const KestCdfTargetImage& other) = default;
@@ -43,7 +43,7 @@ public:
     bool ConvertTargetImageFileNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                          KestCdfNormalizedString ns);
 
-private:
+  private:
     void SetTargetImageAttributes(IXMLDOMNamedNodeMapPtr attributes);
 
     int m_crc = 0;

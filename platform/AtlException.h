@@ -8,7 +8,7 @@
 namespace kest {
 
 class CAtlException : public std::exception {
-public:
+  public:
     explicit CAtlException(HRESULT hr) noexcept : m_hr(hr) {}
     operator HRESULT() const noexcept { return m_hr; }
     HRESULT m_hr;

@@ -122,13 +122,17 @@ std::size_t DecodeUtf8(std::string_view utf8, char16_t* out) noexcept {
         } else if (lead >= 0xE0 && lead <= 0xEF) {
             trail = 2;
             code = lead & 0x0Fu;
-            if (lead == 0xE0) low = 0xA0;       // overlong
-            else if (lead == 0xED) high = 0x9F; // surrogates
+            if (lead == 0xE0)
+                low = 0xA0;  // overlong
+            else if (lead == 0xED)
+                high = 0x9F;  // surrogates
         } else if (lead >= 0xF0 && lead <= 0xF4) {
             trail = 3;
             code = lead & 0x07u;
-            if (lead == 0xF0) low = 0x90;       // overlong
-            else if (lead == 0xF4) high = 0x8F; // above U+10FFFF
+            if (lead == 0xF0)
+                low = 0x90;  // overlong
+            else if (lead == 0xF4)
+                high = 0x8F;  // above U+10FFFF
         } else {
             // Stray continuation byte, overlong lead C0/C1, or F5..FF.
             *o++ = kReplacement;
@@ -212,9 +216,7 @@ bool SysReAllocString(BSTR* target, const OLECHAR* text) noexcept {
     return true;
 }
 
-UINT SysStringLen(BSTR text) noexcept {
-    return text ? StoredBytes(text) / sizeof(OLECHAR) : 0;
-}
+UINT SysStringLen(BSTR text) noexcept { return text ? StoredBytes(text) / sizeof(OLECHAR) : 0; }
 
 UINT SysStringByteLen(BSTR text) noexcept { return text ? StoredBytes(text) : 0; }
 
@@ -247,8 +249,7 @@ std::string Utf16ToUtf8(std::u16string_view utf16) {
             size += 1;
         } else if (unit < 0x800) {
             size += 2;
-        } else if (unit >= 0xD800 && unit <= 0xDBFF && q < end && *q >= 0xDC00 &&
-                   *q <= 0xDFFF) {
+        } else if (unit >= 0xD800 && unit <= 0xDBFF && q < end && *q >= 0xDC00 && *q <= 0xDFFF) {
             size += 4;
             ++q;
         } else {

@@ -10,12 +10,12 @@
 namespace kest {
 
 class _bstr_t {
-public:
+  public:
     _bstr_t() noexcept = default;
     _bstr_t(const _bstr_t& other) noexcept;
     _bstr_t(_bstr_t&& other) noexcept;
-    _bstr_t(const char* utf8);              // null gives a null string
-    _bstr_t(const OLECHAR* text);           // null gives a null string
+    _bstr_t(const char* utf8);     // null gives a null string
+    _bstr_t(const OLECHAR* text);  // null gives a null string
     _bstr_t(std::u16string_view text);
     _bstr_t(const std::string& utf8);
     _bstr_t(const std::u16string& text);
@@ -69,7 +69,7 @@ public:
     std::u16string ToU16String() const { return std::u16string(View()); }
     std::string ToString() const { return Utf16ToUtf8(View()); }
 
-private:
+  private:
     struct Data;
     Data* m_data = nullptr;
 };

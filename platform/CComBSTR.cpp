@@ -60,8 +60,7 @@ CComBSTR::CComBSTR(std::u16string_view text) : m_str(AllocView(text)) {}
 CComBSTR::CComBSTR(const _bstr_t& text)
     : m_str(static_cast<const OLECHAR*>(text) ? AllocView(text.View()) : nullptr) {}
 
-CComBSTR::CComBSTR(const std::string& utf8)
-    : m_str(CheckedAlloc(SysAllocStringFromUtf8(utf8))) {}
+CComBSTR::CComBSTR(const std::string& utf8) : m_str(CheckedAlloc(SysAllocStringFromUtf8(utf8))) {}
 
 CComBSTR::CComBSTR(const CComBSTR& other) : m_str(other.Copy()) {}
 
@@ -180,9 +179,7 @@ CComBSTR& CComBSTR::operator+=(const OLECHAR* text) {
     return *this;
 }
 
-bool CComBSTR::operator==(const CComBSTR& other) const noexcept {
-    return View() == other.View();
-}
+bool CComBSTR::operator==(const CComBSTR& other) const noexcept { return View() == other.View(); }
 
 bool CComBSTR::operator==(const OLECHAR* text) const noexcept {
     std::u16string_view right = text ? std::u16string_view(text) : std::u16string_view();

@@ -11,13 +11,13 @@ namespace kest {
 class _bstr_t;
 
 class CComBSTR {
-public:
+  public:
     CComBSTR() noexcept = default;
     /// A string of `length` zero characters.
     explicit CComBSTR(int length);
     CComBSTR(int length, const OLECHAR* text);
-    CComBSTR(const OLECHAR* text);            // null gives a null string
-    CComBSTR(const char* utf8);               // null gives a null string
+    CComBSTR(const OLECHAR* text);  // null gives a null string
+    CComBSTR(const char* utf8);     // null gives a null string
     CComBSTR(std::u16string_view text);
     /// A copy of the text of a _bstr_t (null gives a null string).
     CComBSTR(const _bstr_t& text);

@@ -45,8 +45,7 @@ std::string BuildMessage(HRESULT hr, const std::string& description) {
 }  // namespace
 
 _com_error::_com_error(HRESULT hr, std::string description)
-    : m_hr(hr), m_description(std::move(description)),
-      m_message(BuildMessage(hr, m_description)) {}
+    : m_hr(hr), m_description(std::move(description)), m_message(BuildMessage(hr, m_description)) {}
 
 std::string HResultName(HRESULT hr) {
     char hex[16];

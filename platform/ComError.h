@@ -9,7 +9,7 @@
 namespace kest {
 
 class _com_error : public std::exception {
-public:
+  public:
     /// An error for the given failure code, with an optional description.
     explicit _com_error(HRESULT hr, std::string description = std::string());
     /// The failure code.
@@ -20,7 +20,7 @@ public:
     const std::string& Description() const noexcept { return m_description; }
     const char* what() const noexcept override { return m_message.c_str(); }
 
-private:
+  private:
     HRESULT m_hr;
     std::string m_description;
     std::string m_message;

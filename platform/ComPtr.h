@@ -14,7 +14,7 @@ namespace kest {
 
 /// Base of every reference-counted platform object; the count is thread-safe.
 class RefCounted {
-public:
+  public:
     void AddRef() const noexcept { m_refs.fetch_add(1, std::memory_order_relaxed); }
     void Release() const noexcept {
         if (m_refs.fetch_sub(1, std::memory_order_acq_rel) == 1) delete this;
@@ -22,19 +22,19 @@ public:
     /// Number of platform objects alive in this process (for leak checks in tests).
     static long LiveObjects() noexcept;
 
-protected:
+  protected:
     RefCounted() noexcept;
     RefCounted(const RefCounted&) = delete;
     RefCounted& operator=(const RefCounted&) = delete;
     virtual ~RefCounted();
 
-private:
+  private:
     mutable std::atomic<long> m_refs{0};
 };
 
 template <class T>
 class ComPtr {
-public:
+  public:
     ComPtr() noexcept = default;
     ComPtr(std::nullptr_t) noexcept {}
     /// Takes a new reference to `object`.
@@ -77,7 +77,7 @@ public:
         return hr;
     }
 
-private:
+  private:
     T* m_p = nullptr;
 };
 

@@ -110,9 +110,8 @@ VARIANT_BOOL LoadBytes(DomDocument& doc, std::string_view bytes, const char* enc
                        const std::string& url) {
     DomError error;
     detail::MemorySource source(bytes);
-    detail::ParsedContent content =
-        detail::ParseXml(source, encoding, url, doc.EffectiveMaxDepth(), error, false,
-                         doc.preserveWhiteSpace);
+    detail::ParsedContent content = detail::ParseXml(source, encoding, url, doc.EffectiveMaxDepth(),
+                                                     error, false, doc.preserveWhiteSpace);
     if (!content.store) {
         doc.Clear();
         doc.error = std::move(error);
@@ -366,8 +365,8 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
         // The file would not load again: refuse it rather than report a save that loses data.
         char code[32];
         std::snprintf(code, sizeof code, "U+%04lX", unrepresentable);
-        throw _com_error(E_FAIL, "cannot save " + path + ": the document holds character " +
-                                     code + ", which XML 1.0 cannot represent");
+        throw _com_error(E_FAIL, "cannot save " + path + ": the document holds character " + code +
+                                     ", which XML 1.0 cannot represent");
     }
     if (::fchmod(fd, mode) != 0) fail(errno, "cannot save to");
     if (::fsync(fd) != 0) fail(errno, "cannot write");
@@ -387,8 +386,7 @@ HRESULT IXMLDOMDocument::CreateDocument(const OLECHAR* progId, detail::DomDocume
     if (!progId) return CO_E_CLASSSTRING;
     std::u16string_view id(progId);
     if (!EqualsNoCase(id, kProgIdDOMDocument40) && !EqualsNoCase(id, kClsidDOMDocument40))
-        return LooksLikeClassId(id) || LooksLikeProgId(id) ? REGDB_E_CLASSNOTREG
-                                                           : CO_E_CLASSSTRING;
+        return LooksLikeClassId(id) || LooksLikeProgId(id) ? REGDB_E_CLASSNOTREG : CO_E_CLASSSTRING;
     try {
         auto* created = new DomDocument();
         *document = created;
@@ -436,13 +434,15 @@ IXMLDOMNodePtr IXMLDOMDocument::createNode(const _variant_t& type, const _bstr_t
 IXMLDOMElementPtr IXMLDOMDocument::createElement(const _bstr_t& tagName) {
     std::string qname = Utf8(tagName);
     if (!detail::IsXmlName(qname)) throw _com_error(E_FAIL, "not a valid name: \"" + qname + "\"");
-    return IXMLDOMElementPtr(m_doc, m_doc->NewNode(NODE_ELEMENT, m_doc->Intern(NODE_ELEMENT, qname, {}, true)));
+    return IXMLDOMElementPtr(
+        m_doc, m_doc->NewNode(NODE_ELEMENT, m_doc->Intern(NODE_ELEMENT, qname, {}, true)));
 }
 
 IXMLDOMAttributePtr IXMLDOMDocument::createAttribute(const _bstr_t& name) {
     std::string qname = Utf8(name);
     if (!detail::IsXmlName(qname)) throw _com_error(E_FAIL, "not a valid name: \"" + qname + "\"");
-    return IXMLDOMAttributePtr(m_doc, m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(NODE_ATTRIBUTE, qname)));
+    return IXMLDOMAttributePtr(
+        m_doc, m_doc->NewNode(NODE_ATTRIBUTE, m_doc->Intern(NODE_ATTRIBUTE, qname)));
 }
 
 IXMLDOMTextPtr IXMLDOMDocument::createTextNode(const _bstr_t& data) {
@@ -457,11 +457,12 @@ IXMLDOMCommentPtr IXMLDOMDocument::createComment(const _bstr_t& data) {
     return IXMLDOMCommentPtr(m_doc, node);
 }
 
-IXMLDOMProcessingInstructionPtr IXMLDOMDocument::createProcessingInstruction(
-    const _bstr_t& target, const _bstr_t& data) {
+IXMLDOMProcessingInstructionPtr IXMLDOMDocument::createProcessingInstruction(const _bstr_t& target,
+                                                                             const _bstr_t& data) {
     std::string name = Utf8(target);
     if (!detail::IsXmlName(name)) throw _com_error(E_FAIL, "not a valid target: \"" + name + "\"");
-    DomNode* node = m_doc->NewNode(NODE_PROCESSING_INSTRUCTION, m_doc->Intern(NODE_PROCESSING_INSTRUCTION, name));
+    DomNode* node = m_doc->NewNode(NODE_PROCESSING_INSTRUCTION,
+                                   m_doc->Intern(NODE_PROCESSING_INSTRUCTION, name));
     if (node->IsDeclaration())
         detail::SetDeclarationText(*m_doc, node, Utf8(data));
     else
@@ -478,10 +479,10 @@ VARIANT_BOOL IXMLDOMDocument::load(const _variant_t& source) {
         std::string bytes;
         if (StartsWithNoCase(location, "http://") || StartsWithNoCase(location, "https://")) {
             if (!doc.serverHttpRequest)
-                return FailLoad(doc, E_ACCESSDENIED,
-                                "loading from a URL needs the ServerHTTPRequest property: " +
-                                    location,
-                                location);
+                return FailLoad(
+                    doc, E_ACCESSDENIED,
+                    "loading from a URL needs the ServerHTTPRequest property: " + location,
+                    location);
             detail::HttpResult fetched = detail::HttpGet(location);
             if (!fetched.ok) return FailLoad(doc, E_FAIL, fetched.error, location);
             bytes = std::move(fetched.body);
@@ -527,7 +528,9 @@ IXMLDOMParseErrorPtr IXMLDOMDocument::GetparseError() const {
 }
 
 void IXMLDOMDocument::Putasync(VARIANT_BOOL async) { m_doc->async = async != VARIANT_FALSE; }
-VARIANT_BOOL IXMLDOMDocument::Getasync() const { return m_doc->async ? VARIANT_TRUE : VARIANT_FALSE; }
+VARIANT_BOOL IXMLDOMDocument::Getasync() const {
+    return m_doc->async ? VARIANT_TRUE : VARIANT_FALSE;
+}
 
 void IXMLDOMDocument::PutpreserveWhiteSpace(VARIANT_BOOL preserve) {
     m_doc->preserveWhiteSpace = preserve != VARIANT_FALSE;
@@ -591,8 +594,8 @@ IXMLDOMParseErrorPtr IXMLDOMDocument2::validate() {
             outcome.code = XML_E_INVALID;
             outcome.reason = "no schema to validate against: none attached and the root names none";
         } else {
-            outcome = detail::ValidateAgainstNamedSchemas(bytes, doc.url, refs,
-                                                          doc.serverHttpRequest);
+            outcome =
+                detail::ValidateAgainstNamedSchemas(bytes, doc.url, refs, doc.serverHttpRequest);
         }
     }
     if (Failed(outcome)) {

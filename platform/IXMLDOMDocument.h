@@ -27,7 +27,7 @@ constexpr const OLECHAR* kProgIdXMLSchemaCache40 = u"Msxml2.XMLSchemaCache.4.0";
 constexpr long kDefaultMaxElementDepth = 10000;
 
 class IXMLDOMDocument : public IXMLDOMNode {
-public:
+  public:
     /// The root element, or an empty pointer.
     IXMLDOMElementPtr GetdocumentElement() const;
     /// New unattached node of kind `type` (an integer VARIANT: 1 element, 2 attribute, 3 text,
@@ -78,7 +78,7 @@ public:
 };
 
 class IXMLDOMDocument2 : public IXMLDOMDocument {
-public:
+  public:
     /// Properties: "ServerHTTPRequest" (bool: allow http/https sources and schema locations),
     /// "MaxElementDepth" (integer, 0 for the default). Other names: E_INVALIDARG.
     void setProperty(const _bstr_t& name, const _variant_t& value);

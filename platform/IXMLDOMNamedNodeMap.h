@@ -7,7 +7,7 @@
 namespace kest {
 
 class IXMLDOMNamedNodeMap : public RefCounted {
-public:
+  public:
     /// The next attribute, or an empty pointer after the last one.
     virtual IXMLDOMNodePtr nextNode() = 0;
     virtual void reset() = 0;

@@ -6,7 +6,7 @@
 namespace kest {
 
 class IXMLDOMNodeList : public RefCounted {
-public:
+  public:
     /// The next node, or an empty pointer after the last one.
     virtual IXMLDOMNodePtr nextNode() = 0;
     /// Starts the walk again at the first node.

@@ -6,8 +6,9 @@
 namespace kest {
 
 class IXMLDOMParseError : public RefCounted {
-public:
-    /// 0 on success; otherwise a failure code (XML_E_PARSEFAILED, XML_E_INVALID, E_ACCESSDENIED...).
+  public:
+    /// 0 on success; otherwise a failure code (XML_E_PARSEFAILED, XML_E_INVALID,
+    /// E_ACCESSDENIED...).
     virtual long GeterrorCode() = 0;
     /// What is wrong and where, e.g. "mismatched tag at line 3, column 5 in /x/a.xml".
     virtual _bstr_t Getreason() = 0;

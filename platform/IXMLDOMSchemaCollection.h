@@ -7,7 +7,7 @@
 namespace kest {
 
 class IXMLDOMSchemaCollection : public RefCounted {
-public:
+  public:
     /// Compiles the schema at `location` (a path or, when allowed, a URL) and registers it under
     /// `namespaceURI`. Throws _com_error when it cannot be read or compiled, or when its target
     /// namespace differs from `namespaceURI`; the collection is then unchanged.

@@ -32,8 +32,7 @@ ULONG CountOf(const SAFEARRAY* array) noexcept { return array->rgsabound[0].cEle
 
 bool BoundsFit(LONG lowerBound, ULONG count) noexcept {
     // The upper bound lowerBound + count - 1 must be a LONG as well.
-    return static_cast<std::int64_t>(lowerBound) + count - 1 <=
-           std::numeric_limits<LONG>::max();
+    return static_cast<std::int64_t>(lowerBound) + count - 1 <= std::numeric_limits<LONG>::max();
 }
 
 bool ResizeStorage(ArrayBlock* block, ULONG capacity) noexcept {

@@ -33,7 +33,8 @@ struct SAFEARRAY {
 SAFEARRAY* SafeArrayCreateVector(VARTYPE vt, LONG lowerBound, ULONG count) noexcept;
 /// New array from bounds; only one dimension of VT_VARIANT is supported.
 SAFEARRAY* SafeArrayCreate(VARTYPE vt, UINT dims, SAFEARRAYBOUND* bounds) noexcept;
-/// Clears every element and frees the array; E_INVALIDARG for null, DISP_E_ARRAYISLOCKED when locked.
+/// Clears every element and frees the array; E_INVALIDARG for null, DISP_E_ARRAYISLOCKED when
+/// locked.
 HRESULT SafeArrayDestroy(SAFEARRAY* array) noexcept;
 /// Stores a copy of *value (a VARIANT) at *index; DISP_E_BADINDEX outside the bounds.
 HRESULT SafeArrayPutElement(SAFEARRAY* array, const LONG* index, const void* value) noexcept;

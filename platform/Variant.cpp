@@ -18,19 +18,19 @@ constexpr VARTYPE kVariantArray = VT_ARRAY | VT_VARIANT;
 
 bool IsSupported(VARTYPE vt) noexcept {
     switch (vt) {
-    case VT_EMPTY:
-    case VT_NULL:
-    case VT_I2:
-    case VT_I4:
-    case VT_R4:
-    case VT_R8:
-    case VT_BSTR:
-    case VT_ERROR:
-    case VT_BOOL:
-    case kVariantArray:
-        return true;
-    default:
-        return false;
+        case VT_EMPTY:
+        case VT_NULL:
+        case VT_I2:
+        case VT_I4:
+        case VT_R4:
+        case VT_R8:
+        case VT_BSTR:
+        case VT_ERROR:
+        case VT_BOOL:
+        case kVariantArray:
+            return true;
+        default:
+            return false;
     }
 }
 
@@ -40,18 +40,18 @@ bool IsNumeric(VARTYPE vt) noexcept {
 
 double NumericValue(const VARIANT& value) noexcept {
     switch (value.vt) {
-    case VT_I2:
-        return value.iVal;
-    case VT_I4:
-        return value.lVal;
-    case VT_R4:
-        return value.fltVal;
-    case VT_R8:
-        return value.dblVal;
-    case VT_BOOL:
-        return value.boolVal ? -1.0 : 0.0;
-    default:
-        return 0.0;
+        case VT_I2:
+            return value.iVal;
+        case VT_I4:
+            return value.lVal;
+        case VT_R4:
+            return value.fltVal;
+        case VT_R8:
+            return value.dblVal;
+        case VT_BOOL:
+            return value.boolVal ? -1.0 : 0.0;
+        default:
+            return 0.0;
     }
 }
 
@@ -67,39 +67,39 @@ double RoundHalfEven(double value) noexcept {
 // Stores `number` into `result` as type vt (one of the numeric types or VT_BOOL).
 HRESULT FromDouble(double number, VARTYPE vt, VARIANT* result) noexcept {
     switch (vt) {
-    case VT_R8:
-        result->dblVal = number;
-        break;
-    case VT_R4:
-        if (std::isfinite(number) && std::fabs(number) > std::numeric_limits<float>::max()) {
-            return DISP_E_OVERFLOW;
+        case VT_R8:
+            result->dblVal = number;
+            break;
+        case VT_R4:
+            if (std::isfinite(number) && std::fabs(number) > std::numeric_limits<float>::max()) {
+                return DISP_E_OVERFLOW;
+            }
+            result->fltVal = static_cast<float>(number);
+            break;
+        case VT_I4: {
+            double rounded = RoundHalfEven(number);
+            // NaN fails both comparisons and is refused too.
+            if (!(rounded >= std::numeric_limits<LONG>::min() &&
+                  rounded <= std::numeric_limits<LONG>::max())) {
+                return DISP_E_OVERFLOW;
+            }
+            result->lVal = static_cast<LONG>(rounded);
+            break;
         }
-        result->fltVal = static_cast<float>(number);
-        break;
-    case VT_I4: {
-        double rounded = RoundHalfEven(number);
-        // NaN fails both comparisons and is refused too.
-        if (!(rounded >= std::numeric_limits<LONG>::min() &&
-              rounded <= std::numeric_limits<LONG>::max())) {
-            return DISP_E_OVERFLOW;
+        case VT_I2: {
+            double rounded = RoundHalfEven(number);
+            if (!(rounded >= std::numeric_limits<SHORT>::min() &&
+                  rounded <= std::numeric_limits<SHORT>::max())) {
+                return DISP_E_OVERFLOW;
+            }
+            result->iVal = static_cast<SHORT>(rounded);
+            break;
         }
-        result->lVal = static_cast<LONG>(rounded);
-        break;
-    }
-    case VT_I2: {
-        double rounded = RoundHalfEven(number);
-        if (!(rounded >= std::numeric_limits<SHORT>::min() &&
-              rounded <= std::numeric_limits<SHORT>::max())) {
-            return DISP_E_OVERFLOW;
-        }
-        result->iVal = static_cast<SHORT>(rounded);
-        break;
-    }
-    case VT_BOOL:
-        result->boolVal = number != 0.0 ? VARIANT_TRUE : VARIANT_FALSE;
-        break;
-    default:
-        return DISP_E_TYPEMISMATCH;
+        case VT_BOOL:
+            result->boolVal = number != 0.0 ? VARIANT_TRUE : VARIANT_FALSE;
+            break;
+        default:
+            return DISP_E_TYPEMISMATCH;
     }
     result->vt = vt;
     return S_OK;
@@ -247,30 +247,30 @@ HRESULT TextOf(Number number, VARIANT* result) noexcept {
 
 HRESULT ToText(const VARIANT& source, VARIANT* result) noexcept {
     switch (source.vt) {
-    case VT_EMPTY: {
-        BSTR empty = SysAllocStringLen(nullptr, 0);
-        if (!empty) return E_OUTOFMEMORY;
-        result->vt = VT_BSTR;
-        result->bstrVal = empty;
-        return S_OK;
-    }
-    case VT_I2:
-        return TextOf(static_cast<int>(source.iVal), result);
-    case VT_I4:
-        return TextOf(static_cast<long>(source.lVal), result);
-    case VT_R4:
-        return TextOf(source.fltVal, result);
-    case VT_R8:
-        return TextOf(source.dblVal, result);
-    case VT_BOOL: {
-        BSTR text = SysAllocString(source.boolVal ? u"True" : u"False");
-        if (!text) return E_OUTOFMEMORY;
-        result->vt = VT_BSTR;
-        result->bstrVal = text;
-        return S_OK;
-    }
-    default:
-        return DISP_E_TYPEMISMATCH;
+        case VT_EMPTY: {
+            BSTR empty = SysAllocStringLen(nullptr, 0);
+            if (!empty) return E_OUTOFMEMORY;
+            result->vt = VT_BSTR;
+            result->bstrVal = empty;
+            return S_OK;
+        }
+        case VT_I2:
+            return TextOf(static_cast<int>(source.iVal), result);
+        case VT_I4:
+            return TextOf(static_cast<long>(source.lVal), result);
+        case VT_R4:
+            return TextOf(source.fltVal, result);
+        case VT_R8:
+            return TextOf(source.dblVal, result);
+        case VT_BOOL: {
+            BSTR text = SysAllocString(source.boolVal ? u"True" : u"False");
+            if (!text) return E_OUTOFMEMORY;
+            result->vt = VT_BSTR;
+            result->bstrVal = text;
+            return S_OK;
+        }
+        default:
+            return DISP_E_TYPEMISMATCH;
     }
 }
 
@@ -302,18 +302,18 @@ void VariantInit(VARIANT* value) noexcept {
 HRESULT VariantClear(VARIANT* value) noexcept {
     if (!value) return E_INVALIDARG;
     switch (value->vt) {
-    case VT_BSTR:
-        SysFreeString(value->bstrVal);
-        break;
-    case kVariantArray:
-        if (value->parray) {
-            HRESULT hr = SafeArrayDestroy(value->parray);
-            if (FAILED(hr)) return hr;
-        }
-        break;
-    default:
-        if (!IsSupported(value->vt)) return DISP_E_BADVARTYPE;
-        break;
+        case VT_BSTR:
+            SysFreeString(value->bstrVal);
+            break;
+        case kVariantArray:
+            if (value->parray) {
+                HRESULT hr = SafeArrayDestroy(value->parray);
+                if (FAILED(hr)) return hr;
+            }
+            break;
+        default:
+            if (!IsSupported(value->vt)) return DISP_E_BADVARTYPE;
+            break;
     }
     VariantInit(value);
     return S_OK;
@@ -326,9 +326,8 @@ HRESULT VariantCopy(VARIANT* target, const VARIANT* source) noexcept {
     // Copy first: the source may be owned by the target (an element of its array).
     VARIANT copy = *source;
     if (source->vt == VT_BSTR && source->bstrVal) {
-        copy.bstrVal =
-            SysAllocStringByteLen(reinterpret_cast<const char*>(source->bstrVal),
-                                  SysStringByteLen(source->bstrVal));
+        copy.bstrVal = SysAllocStringByteLen(reinterpret_cast<const char*>(source->bstrVal),
+                                             SysStringByteLen(source->bstrVal));
         if (!copy.bstrVal) return E_OUTOFMEMORY;
     } else if (source->vt == kVariantArray && source->parray) {
         HRESULT hr = SafeArrayCopy(source->parray, &copy.parray);

@@ -72,6 +72,7 @@ HRESULT VariantCopy(VARIANT* target, const VARIANT* source) noexcept;
 ///   and arrays convert only to their own type (a deep copy) and to VT_EMPTY; otherwise
 ///   DISP_E_TYPEMISMATCH. An unsupported type on either side is DISP_E_BADVARTYPE.
 /// - `flags` is accepted for compatibility and has no effect. On failure *target is unchanged.
-HRESULT VariantChangeType(VARIANT* target, const VARIANT* source, USHORT flags, VARTYPE vt) noexcept;
+HRESULT VariantChangeType(VARIANT* target, const VARIANT* source, USHORT flags,
+                          VARTYPE vt) noexcept;
 
 }  // namespace kest

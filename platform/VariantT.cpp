@@ -39,17 +39,17 @@ LONG CheckedLong(long value) {
 // Fills a cleared VARIANT with a 32-bit integer typed vt (VT_I4, VT_ERROR or VT_BOOL).
 void SetLong(VARIANT& target, LONG value, VARTYPE vt) {
     switch (vt) {
-    case VT_I4:
-        target.lVal = value;
-        break;
-    case VT_ERROR:
-        target.scode = value;
-        break;
-    case VT_BOOL:
-        target.boolVal = value ? VARIANT_TRUE : VARIANT_FALSE;
-        break;
-    default:
-        throw _com_error(E_INVALIDARG);
+        case VT_I4:
+            target.lVal = value;
+            break;
+        case VT_ERROR:
+            target.scode = value;
+            break;
+        case VT_BOOL:
+            target.boolVal = value ? VARIANT_TRUE : VARIANT_FALSE;
+            break;
+        default:
+            throw _com_error(E_INVALIDARG);
     }
     target.vt = vt;
 }
@@ -72,27 +72,27 @@ bool ArraysEqual(SAFEARRAY* left, SAFEARRAY* right) noexcept {
 bool ValuesEqual(const VARIANT& left, const VARIANT& right) noexcept {
     if (left.vt != right.vt) return false;
     switch (left.vt) {
-    case VT_EMPTY:
-    case VT_NULL:
-        return true;
-    case VT_I2:
-        return left.iVal == right.iVal;
-    case VT_I4:
-        return left.lVal == right.lVal;
-    case VT_R4:
-        return left.fltVal == right.fltVal;
-    case VT_R8:
-        return left.dblVal == right.dblVal;
-    case VT_BSTR:
-        return BstrView(left.bstrVal) == BstrView(right.bstrVal);
-    case VT_ERROR:
-        return left.scode == right.scode;
-    case VT_BOOL:
-        return left.boolVal == right.boolVal;
-    case kVariantArray:
-        return ArraysEqual(left.parray, right.parray);
-    default:
-        return false;
+        case VT_EMPTY:
+        case VT_NULL:
+            return true;
+        case VT_I2:
+            return left.iVal == right.iVal;
+        case VT_I4:
+            return left.lVal == right.lVal;
+        case VT_R4:
+            return left.fltVal == right.fltVal;
+        case VT_R8:
+            return left.dblVal == right.dblVal;
+        case VT_BSTR:
+            return BstrView(left.bstrVal) == BstrView(right.bstrVal);
+        case VT_ERROR:
+            return left.scode == right.scode;
+        case VT_BOOL:
+            return left.boolVal == right.boolVal;
+        case kVariantArray:
+            return ArraysEqual(left.parray, right.parray);
+        default:
+            return false;
     }
 }
 
@@ -116,9 +116,7 @@ _variant_t::_variant_t(const _variant_t& source) : tagVARIANT() {
     Check(VariantCopy(this, &source));
 }
 
-_variant_t::_variant_t(_variant_t&& source) noexcept : tagVARIANT(source) {
-    VariantInit(&source);
-}
+_variant_t::_variant_t(_variant_t&& source) noexcept : tagVARIANT(source) { VariantInit(&source); }
 
 _variant_t::_variant_t(VARIANT& source, bool copy) {
     VariantInit(this);

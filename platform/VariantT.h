@@ -10,7 +10,7 @@
 namespace kest {
 
 class _variant_t : public tagVARIANT {
-public:
+  public:
     _variant_t() noexcept;
     _variant_t(const VARIANT& source);
     _variant_t(const VARIANT* source);

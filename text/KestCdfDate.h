@@ -9,7 +9,7 @@
 namespace kest {
 
 class KestCdfDate {
-public:
+  public:
     /// The current local time (thread-safe conversion).
     KestCdfDate();
     KestCdfDate(const KestCdfDate& other) = default;
@@ -17,7 +17,9 @@ public:
     ~KestCdfDate() = default;
 
     /// Copy of all nine fields.
-    struct tm GetDate() const { return m_date; }
+    struct tm GetDate() const {
+        return m_date;
+    }
     /// Copies the nine fields without any check; the pointer must not be null.
     void SetDate(const struct tm* date);
     /// Parses date text (19 or 20 characters); throws KestCalmorphDLLError 34 to 40 on failure,
@@ -48,7 +50,7 @@ public:
     /// 0..59, else reason 39.
     void SetSecond(int second);
 
-private:
+  private:
     struct tm m_date;
 };
 

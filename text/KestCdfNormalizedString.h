@@ -9,7 +9,7 @@
 namespace kest {
 
 class KestCdfNormalizedString {
-public:
+  public:
     /// Empty value (null string).
     KestCdfNormalizedString() = default;
     KestCdfNormalizedString(const KestCdfNormalizedString& other) = default;
@@ -30,7 +30,7 @@ public:
     /// The wrapped text; null means empty.
     CComBSTR m_string;
 
-private:
+  private:
     static bool IsValid(const _bstr_t& text);
     static _bstr_t ConvertString(const _bstr_t& text);
 };

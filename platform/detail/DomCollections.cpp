@@ -50,19 +50,19 @@ IXMLDOMNodePtr DomChain::Item(long index) {
 namespace {
 
 class ChildList final : public IXMLDOMNodeList {
-public:
+  public:
     ChildList(DomDocument* document, DomNode* owner) : m_chain(document, owner, false) {}
     IXMLDOMNodePtr nextNode() override { return m_chain.Next(); }
     void reset() override { m_chain.Reset(); }
     long Getlength() override { return m_chain.Length(); }
     IXMLDOMNodePtr Getitem(long index) override { return m_chain.Item(index); }
 
-private:
+  private:
     DomChain m_chain;
 };
 
 class AttributeMap final : public IXMLDOMNamedNodeMap {
-public:
+  public:
     AttributeMap(DomDocument* document, DomNode* owner) : m_chain(document, owner, true) {}
     IXMLDOMNodePtr nextNode() override { return m_chain.Next(); }
     void reset() override { m_chain.Reset(); }
@@ -112,7 +112,7 @@ public:
         return m_chain.Wrap(node);
     }
 
-private:
+  private:
     static DomNode* Node(const IXMLDOMNodePtr& p) {
         return DomDocument::NodeOf(p.GetInterfacePtr());
     }
@@ -124,7 +124,7 @@ private:
 };
 
 class ParseError final : public IXMLDOMParseError {
-public:
+  public:
     explicit ParseError(const DomError& error) : m_error(error) {}
     long GeterrorCode() override { return m_error.code; }
     _bstr_t Getreason() override { return _bstr_t(m_error.reason); }
@@ -134,7 +134,7 @@ public:
     long Getfilepos() override { return m_error.filepos; }
     _bstr_t GetsrcText() override { return _bstr_t(m_error.srcText); }
 
-private:
+  private:
     DomError m_error;
 };
 

@@ -12,7 +12,7 @@ namespace detail {
 /// A live view of the children (or, for `attributes`, the attribute chain) of a node.
 /// Holds a reference to the document.
 class DomChain {
-public:
+  public:
     DomChain(DomDocument* document, DomNode* owner, bool attributes) noexcept;
     ~DomChain();
     DomChain(const DomChain&) = delete;
@@ -30,7 +30,7 @@ public:
     DomDocument* m_doc;
     DomNode* m_owner;
 
-private:
+  private:
     bool m_attributes;
     bool m_started = false;
     DomNode* m_cursor = nullptr;  // the node nextNode returned last

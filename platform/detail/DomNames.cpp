@@ -41,8 +41,8 @@ void SetDeclarationText(DomDocument& document, DomNode* declaration, std::string
     std::vector<std::pair<std::string_view, std::string_view>> pairs;
     std::size_t i = 0;
     auto fail = [&]() {
-        throw _com_error(E_FAIL, "not a list of XML declaration pseudo-attributes: " +
-                                     std::string(text));
+        throw _com_error(E_FAIL,
+                         "not a list of XML declaration pseudo-attributes: " + std::string(text));
     };
     for (;;) {
         while (i < text.size() && IsBlank(text[i])) ++i;

@@ -28,7 +28,7 @@ struct Builder {
     long maxDepth = 0;
     int doctypeDepth = 0;
     bool inCdata = false;
-    bool utf8Bom = false;  // the bytes start with a UTF-8 byte order mark (encoding not forced)
+    bool utf8Bom = false;   // the bytes start with a UTF-8 byte order mark (encoding not forced)
     bool rootOnly = false;  // stop once the root element's start tag is built
     bool rootSeen = false;
     bool dropBlanksBesideElements = false;
@@ -114,7 +114,8 @@ struct Builder {
 
 bool IsUtf8Label(const char* name) {
     std::string lower;
-    for (const char* p = name; *p; ++p) lower += static_cast<char>(*p >= 'A' && *p <= 'Z' ? *p + 32 : *p);
+    for (const char* p = name; *p; ++p)
+        lower += static_cast<char>(*p >= 'A' && *p <= 'Z' ? *p + 32 : *p);
     return lower == "utf-8" || lower == "utf8";
 }
 
@@ -203,7 +204,8 @@ void XMLCALL OnPI(void* data, const XML_Char* target, const XML_Char* pidata) {
     Guard(data, [&](Builder& b) {
         if (b.doctypeDepth > 0) return;
         b.Flush();
-        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION, b.Name(NODE_PROCESSING_INSTRUCTION, target));
+        DomNode* node = b.store->NewNode(NODE_PROCESSING_INSTRUCTION,
+                                         b.Name(NODE_PROCESSING_INSTRUCTION, target));
         b.store->SetText(node, pidata ? pidata : "");
         LinkChild(b.current, node);
     });
@@ -220,9 +222,10 @@ void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* enco
             return;
         }
         DomNode* decl = b.store->NewNode(NODE_PROCESSING_INSTRUCTION,
-                                          b.store->Intern(NODE_PROCESSING_INSTRUCTION, "xml"));
+                                         b.store->Intern(NODE_PROCESSING_INSTRUCTION, "xml"));
         auto add = [&](const char* name, std::string_view value) {
-            DomNode* attribute = b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(NODE_ATTRIBUTE, name));
+            DomNode* attribute =
+                b.store->NewNode(NODE_ATTRIBUTE, b.store->Intern(NODE_ATTRIBUTE, name));
             b.store->SetText(attribute, value);
             LinkAttribute(decl, attribute);
         };
@@ -240,11 +243,10 @@ void XMLCALL OnDoctypeStart(void* data, const XML_Char*, const XML_Char*, const 
 void XMLCALL OnDoctypeEnd(void* data) { static_cast<Builder*>(data)->doctypeDepth--; }
 
 bool StartsWithUtf16Bom(std::string_view bytes) {
-    return bytes.size() >= 2 &&
-           ((static_cast<unsigned char>(bytes[0]) == 0xFF &&
-             static_cast<unsigned char>(bytes[1]) == 0xFE) ||
-            (static_cast<unsigned char>(bytes[0]) == 0xFE &&
-             static_cast<unsigned char>(bytes[1]) == 0xFF));
+    return bytes.size() >= 2 && ((static_cast<unsigned char>(bytes[0]) == 0xFF &&
+                                  static_cast<unsigned char>(bytes[1]) == 0xFE) ||
+                                 (static_cast<unsigned char>(bytes[0]) == 0xFE &&
+                                  static_cast<unsigned char>(bytes[1]) == 0xFF));
 }
 
 // The line of text around `offset`, for the parse error's srcText.
@@ -270,8 +272,8 @@ std::string LineAt(std::string_view bytes, long offset) {
 
 std::string DescribeLocation(const std::string& what, long line, long column,
                              const std::string& url) {
-    std::string s = what + " at line " + std::to_string(line) + ", column " +
-                    std::to_string(column);
+    std::string s =
+        what + " at line " + std::to_string(line) + ", column " + std::to_string(column);
     if (!url.empty()) s += " in " + url;
     return s;
 }
@@ -293,10 +295,14 @@ HRESULT HResultForErrno(int err) noexcept {
     switch (err) {
         case EACCES:
         case EPERM:
-        case EROFS: return E_ACCESSDENIED;
-        case ENOENT: return static_cast<HRESULT>(0x80070002u);  // file not found
-        case ENOTDIR: return static_cast<HRESULT>(0x80070003u);  // path not found
-        default: return E_FAIL;
+        case EROFS:
+            return E_ACCESSDENIED;
+        case ENOENT:
+            return static_cast<HRESULT>(0x80070002u);  // file not found
+        case ENOTDIR:
+            return static_cast<HRESULT>(0x80070003u);  // path not found
+        default:
+            return E_FAIL;
     }
 }
 

@@ -19,7 +19,7 @@ struct ParsedContent {
 
 /// Bytes to parse, delivered in pieces so that a file need not be held in memory whole.
 class XmlSource {
-public:
+  public:
     virtual ~XmlSource() = default;
     /// The next piece (empty at the end); false with `error` set when reading fails.
     virtual bool Next(std::string_view& piece, std::string& error) = 0;
@@ -28,18 +28,18 @@ public:
 };
 
 class MemorySource final : public XmlSource {
-public:
+  public:
     explicit MemorySource(std::string_view bytes) noexcept;
     bool Next(std::string_view& piece, std::string& error) override;
     std::string LineAround(long offset) override;
 
-private:
+  private:
     std::string_view m_bytes;
     std::size_t m_offset = 0;
 };
 
 class FileSource final : public XmlSource {
-public:
+  public:
     FileSource() = default;
     ~FileSource() override;
     FileSource(const FileSource&) = delete;
@@ -53,7 +53,7 @@ public:
     /// Reads the whole file from its start.
     bool ReadAll(std::string& bytes, std::string& error);
 
-private:
+  private:
     int m_fd = -1;
     std::string m_path;
     std::string m_buffer;

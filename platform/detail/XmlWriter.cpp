@@ -23,7 +23,8 @@ void CheckRaw(std::string_view text) {
         unsigned char c = static_cast<unsigned char>(text[i]);
         if (c < 0x20 && c != '\t' && c != '\n' && c != '\r') {
             NoteUnrepresentable(c);
-        } else if (c == 0xEF && i + 2 < text.size() && static_cast<unsigned char>(text[i + 1]) == 0xBF &&
+        } else if (c == 0xEF && i + 2 < text.size() &&
+                   static_cast<unsigned char>(text[i + 1]) == 0xBF &&
                    (static_cast<unsigned char>(text[i + 2]) & 0xFE) == 0xBE) {
             NoteUnrepresentable(0xFFFE + (static_cast<unsigned char>(text[i + 2]) & 1));
         }
@@ -45,13 +46,27 @@ void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
         unsigned char c = static_cast<unsigned char>(text[i]);
         const char* replacement = nullptr;
         switch (c) {
-            case '&': replacement = "&amp;"; break;
-            case '<': replacement = "&lt;"; break;
-            case '>': replacement = "&gt;"; break;
-            case '"': replacement = attribute ? "&quot;" : nullptr; break;
-            case '\r': replacement = "&#13;"; break;
-            case '\n': replacement = attribute ? "&#10;" : nullptr; break;
-            case '\t': replacement = attribute ? "&#9;" : nullptr; break;
+            case '&':
+                replacement = "&amp;";
+                break;
+            case '<':
+                replacement = "&lt;";
+                break;
+            case '>':
+                replacement = "&gt;";
+                break;
+            case '"':
+                replacement = attribute ? "&quot;" : nullptr;
+                break;
+            case '\r':
+                replacement = "&#13;";
+                break;
+            case '\n':
+                replacement = attribute ? "&#10;" : nullptr;
+                break;
+            case '\t':
+                replacement = attribute ? "&#9;" : nullptr;
+                break;
             default:
                 if (c < 0x20) {
                     out.append(text.data() + run, i - run);
@@ -138,10 +153,12 @@ void AppendPI(std::string& out, const DomNode* node) {
 
 // In-scope namespace bindings of the elements being written; prefix "" is the default.
 class Scope {
-public:
+  public:
     std::size_t Mark() const noexcept { return m_bindings.size(); }
     void Pop(std::size_t mark) { m_bindings.resize(mark); }
-    void Bind(std::string_view prefix, std::string_view uri) { m_bindings.push_back({prefix, uri}); }
+    void Bind(std::string_view prefix, std::string_view uri) {
+        m_bindings.push_back({prefix, uri});
+    }
     /// The URI bound to `prefix`; `bound` false when the prefix is not declared.
     std::string_view Lookup(std::string_view prefix, bool& bound) const {
         for (auto it = m_bindings.rbegin(); it != m_bindings.rend(); ++it)
@@ -158,7 +175,7 @@ public:
         return false;
     }
 
-private:
+  private:
     std::vector<std::pair<std::string_view, std::string_view>> m_bindings;
 };
 
@@ -197,12 +214,23 @@ std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scop
 
 void AppendLeaf(std::string& out, const DomNode* node) {
     switch (node->Type()) {
-        case NODE_TEXT: AppendEscaped(out, node->Text(), false); break;
-        case NODE_CDATA_SECTION: AppendCdata(out, node->Text()); break;
-        case NODE_COMMENT: AppendComment(out, node->Text()); break;
-        case NODE_PROCESSING_INSTRUCTION: AppendPI(out, node); break;
-        case NODE_ATTRIBUTE: AppendAttribute(out, node->Name(), node->Text()); break;
-        default: break;
+        case NODE_TEXT:
+            AppendEscaped(out, node->Text(), false);
+            break;
+        case NODE_CDATA_SECTION:
+            AppendCdata(out, node->Text());
+            break;
+        case NODE_COMMENT:
+            AppendComment(out, node->Text());
+            break;
+        case NODE_PROCESSING_INSTRUCTION:
+            AppendPI(out, node);
+            break;
+        case NODE_ATTRIBUTE:
+            AppendAttribute(out, node->Name(), node->Text());
+            break;
+        default:
+            break;
     }
 }
 

@@ -32,19 +32,23 @@ TEST(KestCalmorphDLLError, RaiseThrowsTheCodeWithEmptyText) {
 }
 
 TEST(KestCalmorphDLLError, ReasonCodesAreDistinct) {
-    const int codes[] = {
-        reason::kCalDataNotConverted, reason::kAxisAttributeMissing, reason::kCalItemReadFailed,
-        reason::kWalkFailed, reason::kCalListReadFailed, reason::kCalDataReadFailed,
-        reason::kCalDataNotAttribute, reason::kTargetImageNotAttribute,
-        reason::kSymbolicFileAttribute, reason::kValueNotAttribute, reason::kAxisNoAttributeMap,
-        reason::kNewElementRefused, reason::kNewElementFailed, reason::kSchemaInstanceMissing,
-        reason::kSchemaLocationMissing, reason::kSymbolicFileMissing, reason::kAxisValueEmpty,
-        reason::kAxisWriteNoAttributeMap, reason::kCalItemValueMissing,
-        reason::kCalListNameMissing, reason::kCalItemNameMissing, reason::kCalItemSizeUnset,
-        reason::kChangeCountUnset, reason::kYearOutOfRange, reason::kMonthOutOfRange,
-        reason::kDayOutOfRange, reason::kHourOutOfRange, reason::kMinuteOutOfRange,
-        reason::kSecondOutOfRange, reason::kDateTextLength, reason::kCalDataNoAttributeMap,
-        reason::kCalDataAttributeMissing, reason::kSchemaNotLoaded, reason::kSchemaLocationAbsent};
+    const int codes[] = {reason::kCalDataNotConverted,   reason::kAxisAttributeMissing,
+                         reason::kCalItemReadFailed,     reason::kWalkFailed,
+                         reason::kCalListReadFailed,     reason::kCalDataReadFailed,
+                         reason::kCalDataNotAttribute,   reason::kTargetImageNotAttribute,
+                         reason::kSymbolicFileAttribute, reason::kValueNotAttribute,
+                         reason::kAxisNoAttributeMap,    reason::kNewElementRefused,
+                         reason::kNewElementFailed,      reason::kSchemaInstanceMissing,
+                         reason::kSchemaLocationMissing, reason::kSymbolicFileMissing,
+                         reason::kAxisValueEmpty,        reason::kAxisWriteNoAttributeMap,
+                         reason::kCalItemValueMissing,   reason::kCalListNameMissing,
+                         reason::kCalItemNameMissing,    reason::kCalItemSizeUnset,
+                         reason::kChangeCountUnset,      reason::kYearOutOfRange,
+                         reason::kMonthOutOfRange,       reason::kDayOutOfRange,
+                         reason::kHourOutOfRange,        reason::kMinuteOutOfRange,
+                         reason::kSecondOutOfRange,      reason::kDateTextLength,
+                         reason::kCalDataNoAttributeMap, reason::kCalDataAttributeMissing,
+                         reason::kSchemaNotLoaded,       reason::kSchemaLocationAbsent};
     std::set<int> seen;
     for (int code : codes) {
         SCOPED_TRACE(code);

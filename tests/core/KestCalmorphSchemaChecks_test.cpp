@@ -48,7 +48,8 @@ class CurrentDirectory {
 
 TEST(KestCalmorphSchemaChecks, ExampleSchemaIsACopyOfTheSchema) {
     ASSERT_FALSE(ReadWholeFile(kSchema).empty());
-    EXPECT_EQ(ReadWholeFile(std::string(KEST_SOURCE_DIR) + "/examples/cdf.xsd"), ReadWholeFile(kSchema));
+    EXPECT_EQ(ReadWholeFile(std::string(KEST_SOURCE_DIR) + "/examples/cdf.xsd"),
+              ReadWholeFile(kSchema));
 }
 
 TEST(KestCalmorphSchemaChecks, ServerFileNameNeedsVersionFourOrLater) {
@@ -76,8 +77,8 @@ TEST(KestCalmorphSchemaChecks, DetectsTheLocationAfterTheFirstBlank) {
     ScratchDir dir;
     fs::copy_file(kSchema, dir / "cdf.xsd");
     WriteWholeFile(dir / "other.xsd",
-                "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
-                "targetNamespace=\"urn:other\"><xs:element name=\"o\"/></xs:schema>");
+                   "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
+                   "targetNamespace=\"urn:other\"><xs:element name=\"o\"/></xs:schema>");
     const std::string longDirectory(150, 'd');
     WriteWholeFile(dir / (longDirectory + "/cdf.xsd"), ReadWholeFile(kSchema));
     struct Row {
@@ -221,8 +222,8 @@ TEST(KestCalmorphSchemaChecks, ValidatesAgainstTheGivenSchema) {
     WriteWholeFile(data, Cdf(kNamed));
     WriteWholeFile(dir / "broken.xsd", "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">");
     WriteWholeFile(dir / "foreign.xsd",
-                "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
-                "targetNamespace=\"urn:foreign\"><xs:element name=\"CAL-DATA\"/></xs:schema>");
+                   "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" "
+                   "targetNamespace=\"urn:foreign\"><xs:element name=\"CAL-DATA\"/></xs:schema>");
     KestCalmorph converter;
     for (const char* name : {"none.xsd", "broken.xsd"}) {
         SCOPED_TRACE(name);

@@ -89,10 +89,17 @@ TEST(BStr, AllocationFailureGivesNull) {
 TEST(BStr, VarBstrCmpIsOrdinalAndNullEqualsEmpty) {
     Owned empty(SysAllocString(u"")), a(SysAllocString(u"a")), upperA(SysAllocString(u"A"));
     Owned ab(SysAllocString(u"ab")), embedded(SysAllocStringLen(u"a\0b", 3));
-    struct Row { const char* label; BSTR left, right; HRESULT expected; } rows[] = {
-        {"null null", nullptr, nullptr, VARCMP_EQ}, {"null empty", nullptr, empty.text, VARCMP_EQ},
-        {"null a", nullptr, a.text, VARCMP_LT}, {"a null", a.text, nullptr, VARCMP_GT},
-        {"A a ordinal", upperA.text, a.text, VARCMP_LT}, {"prefix", a.text, ab.text, VARCMP_LT},
+    struct Row {
+        const char* label;
+        BSTR left, right;
+        HRESULT expected;
+    } rows[] = {
+        {"null null", nullptr, nullptr, VARCMP_EQ},
+        {"null empty", nullptr, empty.text, VARCMP_EQ},
+        {"null a", nullptr, a.text, VARCMP_LT},
+        {"a null", a.text, nullptr, VARCMP_GT},
+        {"A a ordinal", upperA.text, a.text, VARCMP_LT},
+        {"prefix", a.text, ab.text, VARCMP_LT},
         {"embedded zero counts", embedded.text, a.text, VARCMP_GT},
     };
     for (const Row& row : rows) {
@@ -102,7 +109,11 @@ TEST(BStr, VarBstrCmpIsOrdinalAndNullEqualsEmpty) {
 }
 
 TEST(BStr, Utf8ToUtf16ReplacesEachMaximalIllFormedSubpart) {
-    struct Row { const char* label; std::string utf8; std::u16string utf16; } rows[] = {
+    struct Row {
+        const char* label;
+        std::string utf8;
+        std::u16string utf16;
+    } rows[] = {
         {"two byte after eight ascii", "12345678\xC3\xA9", u"12345678\u00E9"},
         {"four byte", "\xF0\x9F\x98\x80", u"\U0001F600"},
         {"largest", "\xF4\x8F\xBF\xBF", u"\U0010FFFF"},
@@ -133,9 +144,14 @@ TEST(BStr, Utf8ToUtf16ReplacesEachMaximalIllFormedSubpart) {
 }
 
 TEST(BStr, Utf16ToUtf8ReplacesUnpairedSurrogates) {
-    struct Row { const char* label; std::u16string utf16; std::string utf8; } rows[] = {
+    struct Row {
+        const char* label;
+        std::u16string utf16;
+        std::string utf8;
+    } rows[] = {
         {"two and three byte", u"\u00E9\u20AC", "\xC3\xA9\xE2\x82\xAC"},
-        {"pair", u"\U0001F600", "\xF0\x9F\x98\x80"}, {"lone high", u"a\xD800z", "a\xEF\xBF\xBDz"},
+        {"pair", u"\U0001F600", "\xF0\x9F\x98\x80"},
+        {"lone high", u"a\xD800z", "a\xEF\xBF\xBDz"},
         {"lone high at end", u"a\xDBFF", "a\xEF\xBF\xBD"},
         {"reversed pair", u"\xDC00\xD800", "\xEF\xBF\xBD\xEF\xBF\xBD"},
         {"high then pair", u"\xD800\xD83D\xDE00", "\xEF\xBF\xBD\xF0\x9F\x98\x80"},

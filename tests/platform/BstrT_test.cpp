@@ -66,7 +66,10 @@ TEST(BstrT, Utf8FormIsCachedAndFollowsChanges) {
     EXPECT_STREQ(static_cast<const char*>(copy), "K\xC3\xA4se \xF0\x9F\x98\x80");
     text += "!";
     EXPECT_STREQ(static_cast<const char*>(text), "k\xC3\xA4se \xF0\x9F\x98\x80!");
-    EXPECT_EQ(_bstr_t("a\xFF" "b").View(), u"a\uFFFDb");
+    EXPECT_EQ(_bstr_t("a\xFF"
+                      "b")
+                  .View(),
+              u"a\uFFFDb");
 }
 
 TEST(BstrT, ConcurrentUtf8ConversionIsSafe) {
@@ -119,11 +122,32 @@ TEST(BstrT, OwnershipTransfer) {
 }
 
 TEST(BstrT, AllocationFailureThrowsComError) {
-    struct Row { const char* label; void (*action)(); } rows[] = {
-        {"utf8", [] { FailAfter fail(0); _bstr_t text("x"); }},
-        {"wide", [] { FailAfter fail(0); _bstr_t text(u"x"); }},
-        {"copy", [] { _bstr_t text("x"); FailAfter fail(0); SysFreeString(text.copy()); }},
-        {"append", [] { _bstr_t text("x"); FailAfter fail(0); text += text; }},
+    struct Row {
+        const char* label;
+        void (*action)();
+    } rows[] = {
+        {"utf8",
+         [] {
+             FailAfter fail(0);
+             _bstr_t text("x");
+         }},
+        {"wide",
+         [] {
+             FailAfter fail(0);
+             _bstr_t text(u"x");
+         }},
+        {"copy",
+         [] {
+             _bstr_t text("x");
+             FailAfter fail(0);
+             SysFreeString(text.copy());
+         }},
+        {"append",
+         [] {
+             _bstr_t text("x");
+             FailAfter fail(0);
+             text += text;
+         }},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);

@@ -104,12 +104,37 @@ TEST(CComBSTR, OwnershipTransfer) {
 }
 
 TEST(CComBSTR, AllocationFailureThrowsOrReportsOutOfMemory) {
-    struct Row { const char* label; void (*action)(); } rows[] = {
-        {"wide constructor", [] { FailAfter fail(0); CComBSTR text(u"x"); }},
-        {"utf8 constructor", [] { FailAfter fail(0); CComBSTR text("x"); }},
-        {"length constructor", [] { FailAfter fail(0); CComBSTR text(4); }},
-        {"copy", [] { CComBSTR text(u"x"); FailAfter fail(0); CComBSTR copy(text); }},
-        {"operator+=", [] { CComBSTR text; FailAfter fail(0); text += u"x"; }},
+    struct Row {
+        const char* label;
+        void (*action)();
+    } rows[] = {
+        {"wide constructor",
+         [] {
+             FailAfter fail(0);
+             CComBSTR text(u"x");
+         }},
+        {"utf8 constructor",
+         [] {
+             FailAfter fail(0);
+             CComBSTR text("x");
+         }},
+        {"length constructor",
+         [] {
+             FailAfter fail(0);
+             CComBSTR text(4);
+         }},
+        {"copy",
+         [] {
+             CComBSTR text(u"x");
+             FailAfter fail(0);
+             CComBSTR copy(text);
+         }},
+        {"operator+=",
+         [] {
+             CComBSTR text;
+             FailAfter fail(0);
+             text += u"x";
+         }},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);

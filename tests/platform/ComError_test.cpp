@@ -5,7 +5,11 @@
 using namespace kest;
 
 TEST(ComError, MessagesNameTheCode) {
-    struct Row { HRESULT code; const char* description; const char* message; } rows[] = {
+    struct Row {
+        HRESULT code;
+        const char* description;
+        const char* message;
+    } rows[] = {
         {E_POINTER, "", "E_POINTER (0x80004003)"},
         {E_OUTOFMEMORY, "", "E_OUTOFMEMORY (0x8007000E)"},
         {DISP_E_TYPEMISMATCH, "not a number", "DISP_E_TYPEMISMATCH (0x80020005): not a number"},

@@ -7,7 +7,7 @@ using namespace kest;
 namespace {
 
 class Probe : public RefCounted {
-public:
+  public:
     int Answer() const { return 42; }
 };
 

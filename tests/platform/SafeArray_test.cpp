@@ -52,7 +52,10 @@ TEST(SafeArray, OnlyOneDimensionOfVariantsWithCheckedBounds) {
     EXPECT_EQ(SafeArrayGetLBound(nullptr, 1, &bound), E_INVALIDARG);
     EXPECT_EQ(SafeArrayPutElement(nullptr, &index, &value), E_INVALIDARG);
 
-    struct Row { LONG lower; ULONG count; } rows[] = {{0, 0}, {1, 2}, {-5, 3}};
+    struct Row {
+        LONG lower;
+        ULONG count;
+    } rows[] = {{0, 0}, {1, 2}, {-5, 3}};
     for (const Row& row : rows) {
         SCOPED_TRACE(testing::Message() << "lower " << row.lower << " count " << row.count);
         SAFEARRAY* array = SafeArrayCreateVector(VT_VARIANT, row.lower, row.count);

@@ -40,8 +40,8 @@ ValidationOutcome Validate(const std::string& document, const std::string& path,
 std::string TinySchema(const std::string& ns, const std::string& type) {
     return kXsdOpen + "targetNamespace=\"" + ns +
            "\" elementFormDefault=\"qualified\"><xs:element name=\"r\"><xs:complexType>"
-           "<xs:sequence><xs:element name=\"v\" type=\"" + type +
-           "\"/></xs:sequence></xs:complexType></xs:element></xs:schema>";
+           "<xs:sequence><xs:element name=\"v\" type=\"" +
+           type + "\"/></xs:sequence></xs:complexType></xs:element></xs:schema>";
 }
 
 std::string TinyDocument(const std::string& ns, const std::string& value) {
@@ -98,7 +98,12 @@ void SetModificationTime(const std::string& path, time_t seconds) {
 }  // namespace
 
 TEST(SchemaValidation, CdfDocumentsAgainstTheCdfSchema) {
-    struct Row { const char* file; HRESULT code; long line; const char* fragment; } rows[] = {
+    struct Row {
+        const char* file;
+        HRESULT code;
+        long line;
+        const char* fragment;
+    } rows[] = {
         {"valid-compact.cdf", S_OK, 0, ""},
         {"valid-indented.cdf", S_OK, 0, ""},
         {"missing-filename.cdf", XML_E_INVALID, 7,
@@ -132,8 +137,8 @@ TEST(SchemaValidation, RelativeLocationsResolveAgainstTheDocumentDirectory) {
         dir.Write(std::string(folder) + "/cdf.xsd", ReadWholeFile(kCdfXsd));
     }
     std::string fileUrl = "file://" + (dir / "schemas/cdf.xsd");
-    for (std::string location : {"cdf.xsd", "../schemas/../data/cdf.xsd",
-                                 "../with space %20/cdf.xsd", fileUrl.c_str()}) {
+    for (std::string location :
+         {"cdf.xsd", "../schemas/../data/cdf.xsd", "../with space %20/cdf.xsd", fileUrl.c_str()}) {
         SCOPED_TRACE(location);
         ValidationOutcome outcome = Validate(kValidCdf, dir / "data/a.cdf", {{kCdfNs, location}});
         EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
@@ -154,7 +159,9 @@ TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
     dir.Write("imports-http.xsd", kXsdOpen + "targetNamespace=\"" + kCdfNs +
                                       "\"><xs:import namespace=\"urn:b\" schemaLocation="
                                       "\"http://127.0.0.1:9/b.xsd\"/></xs:schema>");
-    struct Row { std::string ns, location, fragment; } rows[] = {
+    struct Row {
+        std::string ns, location, fragment;
+    } rows[] = {
         {kCdfNs, "missing.xsd", "missing.xsd cannot be read: No such file or directory"},
         {kCdfNs, "broken.xsd", "broken.xsd:2: "},
         {kCdfNs, "not-a-schema.xsd", "is not a schema document"},
@@ -168,7 +175,8 @@ TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
         {kCdfNs, "imports-http.xsd",
          "http://127.0.0.1:9/b.xsd requires the ServerHTTPRequest property"},
         {"urn:other", kCdfXsd,
-         "has target namespace '" + kCdfNs + "', but the document names it for 'urn:other'"}, };
+         "has target namespace '" + kCdfNs + "', but the document names it for 'urn:other'"},
+    };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.location);
         ValidationOutcome outcome = Validate(kValidCdf, dir / "a.cdf", {{row.ns, row.location}});
@@ -196,7 +204,8 @@ TEST(SchemaValidation, ExternalEntitiesAndDtdsAreNeverRead) {
     dir.Write("broken.ent", "<unclosed");
     dir.Write("broken.dtd", "<!ELEMENT");
     dir.Write("t.xsd", TinySchema("urn:t", "xs:string"));
-    std::string document = "<?xml version=\"1.0\"?>\n<!DOCTYPE r SYSTEM \"broken.dtd\" [\n"
+    std::string document =
+        "<?xml version=\"1.0\"?>\n<!DOCTYPE r SYSTEM \"broken.dtd\" [\n"
         "<!ENTITY ext SYSTEM \"broken.ent\">]>\n<r xmlns=\"urn:t\"><v>&ext;</v></r>";
     ValidationOutcome outcome = Validate(document, dir / "doc.xml", {{"urn:t", "t.xsd"}});
     EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
@@ -259,8 +268,9 @@ TEST(SchemaValidation, SeveralNamedSchemasValidateTogether) {
                            "namespace=\"urn:b\" processContents=\"strict\"/></xs:sequence>"
                            "</xs:complexType></xs:element></xs:schema>");
     dir.Write("dir with space/b.xsd",
-              kXsdOpen + "targetNamespace=\"urn:b\"><xs:element name=\"n\" type=\"xs:int\"/>"
-                         "</xs:schema>");
+              kXsdOpen +
+                  "targetNamespace=\"urn:b\"><xs:element name=\"n\" type=\"xs:int\"/>"
+                  "</xs:schema>");
     std::vector<SchemaRef> refs = {{"urn:a", "a.xsd"}, {"urn:b", "dir with space/b.xsd"}};
     auto validate = [&](const std::string& value) {
         std::string document = "<r xmlns=\"urn:a\"><n xmlns=\"urn:b\">" + value + "</n></r>";
@@ -295,8 +305,8 @@ TEST(SchemaValidation, HttpSchemasNeedPermissionAndResolveAgainstHttpDocuments) 
     EXPECT_EQ(Validate(invalid, "/d/a.cdf", {{kCdfNs, url}}, true).code, XML_E_INVALID);
     // A relative location of a document loaded over http; the schema includes a relative
     // neighbour, fetched the same way.
-    outcome = Validate(kValidCdf, server.Url("data/a.cdf"),
-                                          {{kCdfNs, "../schemas/wrapper.xsd"}}, true);
+    outcome =
+        Validate(kValidCdf, server.Url("data/a.cdf"), {{kCdfNs, "../schemas/wrapper.xsd"}}, true);
     EXPECT_EQ(outcome.code, S_OK) << outcome.reason;
     outcome = Validate(kValidCdf, "/d/a.cdf", {{kCdfNs, server.Url("none.xsd")}}, true);
     EXPECT_EQ(outcome.code, XML_E_PARSEFAILED);

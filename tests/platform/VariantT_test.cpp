@@ -92,7 +92,11 @@ TEST(VariantT, CopyIsDeepAndMoveTransfers) {
 
 TEST(VariantT, ConversionOperatorsThrowTheFailureCode) {
     const HRESULT mismatch = DISP_E_TYPEMISMATCH;
-    struct Row { const char* label; _variant_t value; HRESULT toDouble, toInt, toText; } rows[] = {
+    struct Row {
+        const char* label;
+        _variant_t value;
+        HRESULT toDouble, toInt, toText;
+    } rows[] = {
         {"number text", _variant_t(u" 12.5 "), S_OK, S_OK, S_OK},
         {"word", _variant_t(u"abc"), mismatch, mismatch, S_OK},
         {"null text", _variant_t(_bstr_t{}), mismatch, mismatch, S_OK},
@@ -130,14 +134,17 @@ TEST(VariantT, ChangeTypeInPlaceAndFromSource) {
 }
 
 TEST(VariantT, EqualityComparesTypeAndValue) {
-    struct Row { const char* label; _variant_t left, right; bool equal; } rows[] = {
+    struct Row {
+        const char* label;
+        _variant_t left, right;
+        bool equal;
+    } rows[] = {
         {"int vs double", _variant_t(1), _variant_t(1.0), false},
         {"null text vs empty", _variant_t(_bstr_t{}), _variant_t(u""), true},
         {"case", _variant_t(u"a"), _variant_t(u"A"), false},
         {"arrays", ArrayOf({_variant_t(1), _variant_t(u"x")}),
          ArrayOf({_variant_t(1), _variant_t(u"x")}), true},
-        {"array lengths", ArrayOf({_variant_t(1)}), ArrayOf({_variant_t(1), _variant_t(1)}),
-         false},
+        {"array lengths", ArrayOf({_variant_t(1)}), ArrayOf({_variant_t(1), _variant_t(1)}), false},
         {"array elements", ArrayOf({_variant_t(1)}), ArrayOf({_variant_t(2)}), false},
     };
     for (const Row& row : rows) {

@@ -52,12 +52,22 @@ constexpr HRESULT kOverflow = DISP_E_OVERFLOW;
 }  // namespace
 
 TEST(Variant, NumbersToTextAreShortestRoundTrip) {
-    struct Row { double number; const char16_t* text; } rows[] = {
-        {0.0, u"0"}, {-0.0, u"-0"}, {1.0 / 3.0, u"0.3333333333333333"},
-        {123456789012345678.0, u"123456789012345680"}, {1e21, u"1e+21"}, {1e-5, u"1e-05"},
-        {0.0001, u"1e-04"}, {0.001, u"0.001"},  // a tie in length keeps fixed notation
-        {5e-324, u"5e-324"}, {std::numeric_limits<double>::max(), u"1.7976931348623157e+308"},
-        {std::numeric_limits<double>::quiet_NaN(), u"NaN"}, {-kInf, u"-Infinity"},
+    struct Row {
+        double number;
+        const char16_t* text;
+    } rows[] = {
+        {0.0, u"0"},
+        {-0.0, u"-0"},
+        {1.0 / 3.0, u"0.3333333333333333"},
+        {123456789012345678.0, u"123456789012345680"},
+        {1e21, u"1e+21"},
+        {1e-5, u"1e-05"},
+        {0.0001, u"1e-04"},
+        {0.001, u"0.001"},  // a tie in length keeps fixed notation
+        {5e-324, u"5e-324"},
+        {std::numeric_limits<double>::max(), u"1.7976931348623157e+308"},
+        {std::numeric_limits<double>::quiet_NaN(), u"NaN"},
+        {-kInf, u"-Infinity"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(testing::Message() << row.number);
@@ -95,17 +105,39 @@ TEST(Variant, TypesWithoutTextFormAreRefused) {
 }
 
 TEST(Variant, TextToNumbers) {
-    struct Row { const char16_t* text; HRESULT hr; double number; } rows[] = {
-        {u"+42", S_OK, 42}, {u".5", S_OK, 0.5}, {u"5.", S_OK, 5}, {u"-.5e1", S_OK, -5},
-        {u"1E+05", S_OK, 1e5}, {u" \t\r\n12.25 \n", S_OK, 12.25},
+    struct Row {
+        const char16_t* text;
+        HRESULT hr;
+        double number;
+    } rows[] = {
+        {u"+42", S_OK, 42},
+        {u".5", S_OK, 0.5},
+        {u"5.", S_OK, 5},
+        {u"-.5e1", S_OK, -5},
+        {u"1E+05", S_OK, 1e5},
+        {u" \t\r\n12.25 \n", S_OK, 12.25},
         {u"1.7976931348623157e308", S_OK, std::numeric_limits<double>::max()},
-        {u"1e-400", S_OK, 0}, {u"4.9e-324", S_OK, 5e-324}, {u"0e999999", S_OK, 0},
-        {u"-1e309", kOverflow, 0}, {u"123456789e301", kOverflow, 0}, {u"", kMismatch, 0},
-        {nullptr, kMismatch, 0}, {u"   ", kMismatch, 0}, {u"12abc", kMismatch, 0},
-        {u"1 2", kMismatch, 0}, {u"inf", kMismatch, 0}, {u"NaN", kMismatch, 0},
-        {u"0x10", kMismatch, 0}, {u"1,5", kMismatch, 0}, {u"1e+", kMismatch, 0},
-        {u"-", kMismatch, 0}, {u".", kMismatch, 0}, {u"+-1", kMismatch, 0},
-        {u"1..2", kMismatch, 0}, {u"\u00A01", kMismatch, 0}, {u"\u0661", kMismatch, 0},
+        {u"1e-400", S_OK, 0},
+        {u"4.9e-324", S_OK, 5e-324},
+        {u"0e999999", S_OK, 0},
+        {u"-1e309", kOverflow, 0},
+        {u"123456789e301", kOverflow, 0},
+        {u"", kMismatch, 0},
+        {nullptr, kMismatch, 0},
+        {u"   ", kMismatch, 0},
+        {u"12abc", kMismatch, 0},
+        {u"1 2", kMismatch, 0},
+        {u"inf", kMismatch, 0},
+        {u"NaN", kMismatch, 0},
+        {u"0x10", kMismatch, 0},
+        {u"1,5", kMismatch, 0},
+        {u"1e+", kMismatch, 0},
+        {u"-", kMismatch, 0},
+        {u".", kMismatch, 0},
+        {u"+-1", kMismatch, 0},
+        {u"1..2", kMismatch, 0},
+        {u"\u00A01", kMismatch, 0},
+        {u"\u0661", kMismatch, 0},
         {u"1\v", kMismatch, 0},
     };
     for (const Row& row : rows) {
@@ -133,13 +165,24 @@ TEST(Variant, DoubleTextRoundTripsExactly) {
 }
 
 TEST(Variant, IntegerTargetsRoundHalfToEvenAndCheckRange) {
-    struct Row { double number; VARTYPE vt; HRESULT hr; const char16_t* text; } rows[] = {
-        {2.5, VT_I4, S_OK, u"2"}, {3.5, VT_I4, S_OK, u"4"}, {-2.5, VT_I4, S_OK, u"-2"},
-        {2.5000001, VT_I4, S_OK, u"3"}, {2147483647.4, VT_I4, S_OK, u"2147483647"},
-        {2147483647.5, VT_I4, kOverflow, u""}, {-2147483648.5, VT_I4, S_OK, u"-2147483648"},
-        {-2147483649.0, VT_I4, kOverflow, u""}, {kInf, VT_I4, kOverflow, u""},
+    struct Row {
+        double number;
+        VARTYPE vt;
+        HRESULT hr;
+        const char16_t* text;
+    } rows[] = {
+        {2.5, VT_I4, S_OK, u"2"},
+        {3.5, VT_I4, S_OK, u"4"},
+        {-2.5, VT_I4, S_OK, u"-2"},
+        {2.5000001, VT_I4, S_OK, u"3"},
+        {2147483647.4, VT_I4, S_OK, u"2147483647"},
+        {2147483647.5, VT_I4, kOverflow, u""},
+        {-2147483648.5, VT_I4, S_OK, u"-2147483648"},
+        {-2147483649.0, VT_I4, kOverflow, u""},
+        {kInf, VT_I4, kOverflow, u""},
         {std::numeric_limits<double>::quiet_NaN(), VT_I4, kOverflow, u""},
-        {32767.5, VT_I2, kOverflow, u""}, {-32768.5, VT_I2, S_OK, u"-32768"},
+        {32767.5, VT_I2, kOverflow, u""},
+        {-32768.5, VT_I2, S_OK, u"-32768"},
         {4.5, VT_I2, S_OK, u"4"},
     };
     for (const Row& row : rows) {
@@ -161,10 +204,14 @@ TEST(Variant, FloatBoolEmptyAndNullTargets) {
     std::u16string text;
     EXPECT_EQ(Convert(Var(-3.4e38), VT_R4, &text), S_OK);
     EXPECT_EQ(text, u"-3.4e+38");
-    struct Row { const char16_t* text; HRESULT hr; const char16_t* result; } rows[] = {
+    struct Row {
+        const char16_t* text;
+        HRESULT hr;
+        const char16_t* result;
+    } rows[] = {
         {u" TRUE ", S_OK, u"True"}, {u"fAlSe", S_OK, u"False"}, {u"-1", S_OK, u"True"},
-        {u"0", S_OK, u"False"}, {u"2.5", S_OK, u"True"}, {u"yes", kMismatch, u""},
-        {u"", kMismatch, u""}, {u"Truee", kMismatch, u""},
+        {u"0", S_OK, u"False"},     {u"2.5", S_OK, u"True"},    {u"yes", kMismatch, u""},
+        {u"", kMismatch, u""},      {u"Truee", kMismatch, u""},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(Utf16ToUtf8(row.text));

@@ -44,7 +44,10 @@ _com_error AddError(IXMLDOMSchemaCollection& cache, const std::string& ns,
 }  // namespace
 
 TEST(XMLSchemaCache, CreateInstanceKnowsOnlyTheSchemaCacheProgId) {
-    struct Row { const OLECHAR* progId; HRESULT expected; } rows[] = {
+    struct Row {
+        const OLECHAR* progId;
+        HRESULT expected;
+    } rows[] = {
         {u"msxml2.xmlschemacache.4.0", S_OK},  // ProgIDs ignore case
         {u"Msxml2.XMLSchemaCache.6.0", REGDB_E_CLASSNOTREG},
         {u"Msxml2.DOMDocument.4.0", REGDB_E_CLASSNOTREG},
@@ -140,12 +143,14 @@ TEST(XMLSchemaCache, ValidatesDocumentsAgainstItsSchemas) {
 
     // With a second namespace the schemas are used together.
     ScratchDir dir;
-    std::string wrapper = dir.Write(
-        "w.xsd", "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" targetNamespace="
-                 "\"urn:w\" elementFormDefault=\"qualified\"><xs:element name=\"w\">"
-                 "<xs:complexType><xs:sequence><xs:any namespace=\"" + kCdfNs +
-                     "\" processContents=\"strict\"/></xs:sequence></xs:complexType>"
-                     "</xs:element></xs:schema>");
+    std::string wrapper =
+        dir.Write("w.xsd",
+                  "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\" targetNamespace="
+                  "\"urn:w\" elementFormDefault=\"qualified\"><xs:element name=\"w\">"
+                  "<xs:complexType><xs:sequence><xs:any namespace=\"" +
+                      kCdfNs +
+                      "\" processContents=\"strict\"/></xs:sequence></xs:complexType>"
+                      "</xs:element></xs:schema>");
     cache->add(_bstr_t("urn:w"), _variant_t(wrapper));
     auto wrapped = [](const std::string& path) {
         std::string text = ReadWholeFile(path);

@@ -55,7 +55,8 @@ void ReadCatalogue(const std::string& path, const std::string& base, std::vector
     text = "<CATALOGUE>" + text + "</CATALOGUE>";
     IXMLDOMDocument2Ptr doc = NewDocument();
     doc->PutvalidateOnParse(VARIANT_FALSE);
-    ASSERT_EQ(doc->loadBuffer(text.data(), text.size()), VARIANT_TRUE) << path << ": " << ReasonOf(doc);
+    ASSERT_EQ(doc->loadBuffer(text.data(), text.size()), VARIANT_TRUE)
+        << path << ": " << ReasonOf(doc);
     std::vector<IXMLDOMNodePtr> stack{doc->GetdocumentElement()};
     while (!stack.empty()) {
         IXMLDOMElementPtr element = stack.back();
@@ -110,14 +111,29 @@ std::vector<Case> AllCases() {
 void AppendCanonicalText(std::string& out, const std::string& text) {
     for (char c : text) {
         switch (c) {
-            case '&': out += "&amp;"; break;
-            case '<': out += "&lt;"; break;
-            case '>': out += "&gt;"; break;
-            case '"': out += "&quot;"; break;
-            case '\t': out += "&#9;"; break;
-            case '\n': out += "&#10;"; break;
-            case '\r': out += "&#13;"; break;
-            default: out += c;
+            case '&':
+                out += "&amp;";
+                break;
+            case '<':
+                out += "&lt;";
+                break;
+            case '>':
+                out += "&gt;";
+                break;
+            case '"':
+                out += "&quot;";
+                break;
+            case '\t':
+                out += "&#9;";
+                break;
+            case '\n':
+                out += "&#10;";
+                break;
+            case '\r':
+                out += "&#13;";
+                break;
+            default:
+                out += c;
         }
     }
 }
@@ -132,7 +148,8 @@ void AppendCanonical(std::string& out, const IXMLDOMNodePtr& node) {
             std::vector<std::pair<std::string, std::string>> attributes;
             IXMLDOMNamedNodeMapPtr map = node->Getattributes();
             while (IXMLDOMNodePtr a = map->nextNode())
-                attributes.emplace_back(Utf8Of(a->GetnodeName()), Utf8Of(_bstr_t(a->GetnodeValue())));
+                attributes.emplace_back(Utf8Of(a->GetnodeName()),
+                                        Utf8Of(_bstr_t(a->GetnodeValue())));
             std::sort(attributes.begin(), attributes.end());
             for (const auto& a : attributes) {
                 out += " " + a.first + "=\"";
@@ -151,8 +168,8 @@ void AppendCanonical(std::string& out, const IXMLDOMNodePtr& node) {
             break;
         case NODE_PROCESSING_INSTRUCTION:
             if (Utf8Of(node->GetnodeName()) == "xml") break;
-            out += "<?" + Utf8Of(node->GetnodeName()) + " " + Utf8Of(_bstr_t(node->GetnodeValue())) +
-                   "?>";
+            out += "<?" + Utf8Of(node->GetnodeName()) + " " +
+                   Utf8Of(_bstr_t(node->GetnodeValue())) + "?>";
             break;
         case NODE_DOCUMENT: {
             IXMLDOMNodeListPtr children = node->GetchildNodes();

@@ -15,8 +15,8 @@ class LiveObjectCheck : public ::testing::EmptyTestEventListener {
     }
     void OnTestEnd(const ::testing::TestInfo& info) override {
         long after = kest::RefCounted::LiveObjects();
-        EXPECT_EQ(m_before, after) << "platform objects leaked by " << info.test_suite_name()
-                                   << "." << info.name();
+        EXPECT_EQ(m_before, after)
+            << "platform objects leaked by " << info.test_suite_name() << "." << info.name();
         EXPECT_EQ(m_documentsBefore, kest::detail::LiveDocuments())
             << "DOM documents leaked by " << info.test_suite_name() << "." << info.name();
     }

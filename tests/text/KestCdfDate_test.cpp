@@ -78,10 +78,8 @@ TEST(KestCdfDate, ParsesAndWritesDateText) {
         {"minus with 19 chars is a field", u"-999-05-06T07:08:09", 34, u"2001-02-03T04:05:06"},
         // Digits in the separator positions: a conversion that read past its group would
         // see 19991, 051, ... and refuse them.
-        {"groups end at their last character", u"1999105106T07108109", -1,
-         u"1999-05-06T07:08:09"},
-        {"fullwidth digits are no digits", u"\uFF11999-05-06T07:08:09", 34,
-         u"2001-02-03T04:05:06"},
+        {"groups end at their last character", u"1999105106T07108109", -1, u"1999-05-06T07:08:09"},
+        {"fullwidth digits are no digits", u"\uFF11999-05-06T07:08:09", 34, u"2001-02-03T04:05:06"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);

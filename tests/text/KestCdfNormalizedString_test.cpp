@@ -7,7 +7,11 @@
 using namespace kest;
 
 TEST(KestCdfNormalizedString, AssignmentFromBstrReplacesWithoutCollapsing) {
-    struct Row { const char* label; std::u16string input; std::u16string expected; } rows[] = {
+    struct Row {
+        const char* label;
+        std::u16string input;
+        std::u16string expected;
+    } rows[] = {
         {"tab, line feed, carriage return", u"A\tB\nC\rD", u"A B C D"},
         {"CR LF gives two spaces", u"A\r\nB", u"A  B"},
         {"runs and ends survive", u"\t\nx  y\r\t", u"  x  y  "},

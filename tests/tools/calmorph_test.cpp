@@ -61,15 +61,16 @@ struct Files {
         WriteWholeFile(dir / "invalid.cdf", Cdf("cdf.xsd", "\n<NOTE>no FILENAME before me</NOTE>"));
         WriteWholeFile(dir / "malformed.cdf", Cdf("cdf.xsd", "\n<FILENAME>f</NOTE>"));
         WriteWholeFile(dir / "elsewhere.cdf", Cdf("nowhere.xsd", "<FILENAME>f</FILENAME>"));
-        WriteWholeFile(dir / "unnamed.cdf", "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><FILENAME/></CAL-DATA>");
+        WriteWholeFile(dir / "unnamed.cdf",
+                       "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><FILENAME/></CAL-DATA>");
         WriteWholeFile(dir / "twoattrs.cdf", "<CAL-DATA a=\"1\" b=\"2\"/>");
         WriteWholeFile(dir / "other.xml", "<other><thing/></other>");
         WriteWholeFile(dir / "brokenitem.cdf",
-                    "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><CAL-LIST><NAME>L</NAME><CAL-ITEM><NAME>"
-                    "Broken Item</NAME><AXIS/></CAL-ITEM></CAL-LIST></CAL-DATA>");
+                       "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><CAL-LIST><NAME>L</NAME><CAL-ITEM><NAME>"
+                       "Broken Item</NAME><AXIS/></CAL-ITEM></CAL-LIST></CAL-DATA>");
         WriteWholeFile(dir / "nameless.cdf",
-                    "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><CHANGE-HISTORY/><FILENAME/><CAL-LIST>"
-                    "<SYMBOLIC-FILE crc32=\"0x1\">s.a2l</SYMBOLIC-FILE></CAL-LIST></CAL-DATA>");
+                       "<CAL-DATA a=\"\" b=\"i\" c=\"l\"><CHANGE-HISTORY/><FILENAME/><CAL-LIST>"
+                       "<SYMBOLIC-FILE crc32=\"0x1\">s.a2l</SYMBOLIC-FILE></CAL-LIST></CAL-DATA>");
     }
 };
 
@@ -97,8 +98,9 @@ TEST(Calmorph, InfoPrintsTheSampleAsRecorded) {
         Result result = RunTool(args, kExamples);
         EXPECT_EQ(result.code, 0);
         EXPECT_EQ(result.err, "");
-        EXPECT_EQ(result.out, ReadWholeFile(kGolden + (args.size() == 2 ? "sample-info.txt"
-                                                                     : "sample-info-items.txt")));
+        EXPECT_EQ(result.out,
+                  ReadWholeFile(kGolden +
+                                (args.size() == 2 ? "sample-info.txt" : "sample-info-items.txt")));
     }
 }
 
