@@ -253,6 +253,10 @@ void InitLibxml() {
     static std::once_flag once;
     std::call_once(once, [] {
         xmlInitParser();
+        // The built-in types are set up lazily by the first schema compile, and that set-up is
+        // not safe when two threads compile at once: one copy would be lost. Doing it here,
+        // once, keeps concurrent first compiles apart.
+        xmlSchemaInitTypes();
         g_previousLoader = xmlGetExternalEntityLoader();
         xmlSetExternalEntityLoader(GuardedEntityLoader);
     });
