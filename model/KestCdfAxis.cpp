@@ -34,9 +34,9 @@ unsigned int SizeFromDouble(double value) noexcept {
 
 // The size as the signed 32-bit number its bits stand for.
 _variant_t SizeText(unsigned int size) {
-    const std::int64_t signedSize =
-        size > static_cast<unsigned int>(INT_MAX) ? static_cast<std::int64_t>(size) - 0x100000000LL
-                                                  : static_cast<std::int64_t>(size);
+    const std::int64_t signedSize = size > static_cast<unsigned int>(INT_MAX)
+                                        ? static_cast<std::int64_t>(size) - 0x100000000LL
+                                        : static_cast<std::int64_t>(size);
     char narrow[16];
     const char* end = std::to_chars(narrow, narrow + sizeof narrow, signedSize).ptr;
     OLECHAR wide[16];
@@ -141,8 +141,7 @@ _variant_t KestCdfAxis::PutNumbersIntoSafeArray(const _variant_t& value, _varian
     char16_t wide[detail::kDoubleTextCapacity];
     std::size_t length = 0;
     for (const char* p = narrow; p != end; ++p) wide[length++] = static_cast<char16_t>(*p);
-    detail::FillNumbers(std::u16string_view(wide, length), detail::NumberTyping::kWholeText,
-                        array);
+    detail::FillNumbers(std::u16string_view(wide, length), detail::NumberTyping::kWholeText, array);
     return array;
 }
 

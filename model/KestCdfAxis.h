@@ -11,7 +11,7 @@
 namespace kest {
 
 class KestCdfAxis {
-public:
+  public:
     /// An empty axis: value VT_EMPTY, size 0, empty units and format type.
     KestCdfAxis();
     /// Deep copies of the value (array and elements) and both strings.
@@ -41,18 +41,19 @@ public:
     /// Reads an AXIS element: its first three attributes by position (size, units, format
     /// type), then the value of its last child node. The size text is read as a number,
     /// truncated toward zero, and its low 32 bits kept (-1 gives 4294967295); a number beyond
-    /// the 64-bit range saturates at that range's limits first. Throws KestCalmorphDLLError 20 without an
-    /// attribute map, 11 when an attribute is missing; _com_error for an absent node or a size
-    /// that is no number. Returns true.
+    /// the 64-bit range saturates at that range's limits first. Throws KestCalmorphDLLError 20
+    /// without an attribute map, 11 when an attribute is missing; _com_error for an absent node or
+    /// a size that is no number. Returns true.
     bool ConvertAxisNode(IXMLDOMNodePtr node);
     /// Appends a new AXIS element (namespace `ns`) to `parent` with the attributes size (as a
-    /// signed 32-bit number), sw-units and format-type and the points as text. Throws KestCalmorphDLLError 27 when the
-    /// new element has no attribute map and 26 when the value is VT_EMPTY (the element stays
-    /// attached); _com_error for an absent parent or document. Returns true.
+    /// signed 32-bit number), sw-units and format-type and the points as text. Throws
+    /// KestCalmorphDLLError 27 when the new element has no attribute map and 26 when the value is
+    /// VT_EMPTY (the element stays attached); _com_error for an absent parent or document. Returns
+    /// true.
     bool ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                               KestCdfNormalizedString ns);
 
-private:
+  private:
     void SetAxisAttributes(IXMLDOMNamedNodeMapPtr attributes);
     unsigned int GetNodeValue(IXMLDOMNodePtr node);
     _bstr_t GetNodeString(IXMLDOMNodePtr node);

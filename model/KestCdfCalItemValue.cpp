@@ -150,8 +150,7 @@ _bstr_t KestCdfCalItemValue::GetNodeString(IXMLDOMNodePtr node) {
     return detail::TakeText(node->GetnodeValue());
 }
 
-bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent,
-                                                       IXMLDOMDocument* doc,
+bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                                        KestCdfNormalizedString ns) {
     if (!doc) throw _com_error(E_POINTER);
     // The namespace is this call's own copy: handed over, not copied again.

@@ -11,7 +11,7 @@
 namespace kest {
 
 class KestCdfCalItemValue {
-public:
+  public:
     /// An empty value: VT_EMPTY, empty units and format type, not read from a document.
     KestCdfCalItemValue();
     /// Deep copies of the value (array and elements), both strings and the from-document flag.
@@ -49,7 +49,7 @@ public:
     bool ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                       KestCdfNormalizedString ns);
 
-private:
+  private:
     _bstr_t GetNodeString(IXMLDOMNodePtr node);
     // The value list codec with this class's rules (see KestCdfValueListCodec.h). The text
     // and values are passed by reference and the array by move: these run once per value of a

@@ -1,5 +1,7 @@
 #include "KestCdfValueListCodec.h"
 
+#include <locale.h>
+#include <stdlib.h>
 #include <algorithm>
 #include <cfloat>
 #include <charconv>
@@ -9,8 +11,6 @@
 #include <cstring>
 #include <memory>
 #include <new>
-#include <locale.h>
-#include <stdlib.h>
 #include <string>
 #include <system_error>
 #include <type_traits>
@@ -24,9 +24,7 @@ constexpr VARTYPE kArrayOfVariants = VT_ARRAY | VT_VARIANT;
 
 // The white-space set of isspace in the C locale; the host's locale must not change what a
 // file means.
-inline bool IsCSpace(char c) noexcept {
-    return c == ' ' || (c >= '\t' && c <= '\r');
-}
+inline bool IsCSpace(char c) noexcept { return c == ' ' || (c >= '\t' && c <= '\r'); }
 
 inline bool IsDigit(char c) noexcept { return c >= '0' && c <= '9'; }
 
@@ -72,7 +70,7 @@ void CheckArray(const VARIANT& array) {
 
 // Element access for the duration of one fill or read.
 class ArrayData {
-public:
+  public:
     explicit ArrayData(SAFEARRAY* array) : m_array(array) {
         ThrowIfFailed(SafeArrayAccessData(array, reinterpret_cast<void**>(&m_data)));
     }
@@ -81,7 +79,7 @@ public:
     ArrayData& operator=(const ArrayData&) = delete;
     VARIANT* get() const noexcept { return m_data; }
 
-private:
+  private:
     SAFEARRAY* m_array;
     VARIANT* m_data = nullptr;
 };
@@ -92,7 +90,7 @@ private:
 // GetNumbersFromSafeArray come from the same rules: everything but string elements is ASCII.
 template <class Char>
 class TextBuilder {
-public:
+  public:
     TextBuilder() noexcept = default;
     TextBuilder(const TextBuilder&) = delete;
     TextBuilder& operator=(const TextBuilder&) = delete;
@@ -160,7 +158,7 @@ public:
     const Char* data() const noexcept { return m_begin; }
     std::size_t size() const noexcept { return static_cast<std::size_t>(m_end - m_begin); }
 
-private:
+  private:
     void Grow(std::size_t extra) {
         const std::size_t used = size();
         const std::size_t capacity =
@@ -229,25 +227,25 @@ template <class Char>
 void AppendElement(TextBuilder<Char>& out, const VARIANT& element, ElementWriting writing,
                    bool quoteStrings) {
     switch (element.vt) {
-    case VT_BSTR: {
-        const std::u16string_view text = BstrView(element.bstrVal);
-        // A string that holds a quote cannot be quoted faithfully (there is no escape); it is
-        // written as it stands, which also keeps a host's pre-quoted text unchanged.
-        const bool quote = quoteStrings && text.find(u'"') == std::u16string_view::npos;
-        if (quote) out.Push('"');
-        out.Append(text);
-        if (quote) out.Push('"');
-        return;
-    }
-    case VT_R8:
-        // "%.15g" never writes a ',' in the C locale, so no separator needs replacing.
-        AppendDouble(out, element.dblVal);
-        return;
-    case VT_I4:
-        AppendInt(out, element.lVal);
-        return;
-    default:
-        break;
+        case VT_BSTR: {
+            const std::u16string_view text = BstrView(element.bstrVal);
+            // A string that holds a quote cannot be quoted faithfully (there is no escape); it is
+            // written as it stands, which also keeps a host's pre-quoted text unchanged.
+            const bool quote = quoteStrings && text.find(u'"') == std::u16string_view::npos;
+            if (quote) out.Push('"');
+            out.Append(text);
+            if (quote) out.Push('"');
+            return;
+        }
+        case VT_R8:
+            // "%.15g" never writes a ',' in the C locale, so no separator needs replacing.
+            AppendDouble(out, element.dblVal);
+            return;
+        case VT_I4:
+            AppendInt(out, element.lVal);
+            return;
+        default:
+            break;
     }
     if (writing == ElementWriting::kCalItemValue) {
         if (element.vt != VT_EMPTY) AppendPlatformText(out, element);
@@ -630,11 +628,11 @@ bool FormatScaled(double magnitude, bool negative, char*& out) noexcept {
     std::uint64_t bits;
     std::memcpy(&bits, &magnitude, sizeof bits);
     const int binaryExponent = static_cast<int>(bits >> 52) - 1023;  // normal: 2^e <= magnitude
-    int exponent = (binaryExponent * 78913) >> 18;  // floor(e * log10(2))
+    int exponent = (binaryExponent * 78913) >> 18;                   // floor(e * log10(2))
     const int scale = kPrecision - 1 - exponent;  // makes fifteen digits before the point
     if (scale < -kLargestExactPower + 1 || scale > kLargestExactPower) return false;
-    double scaled = scale >= 0 ? magnitude * kExactPowersOfTen[scale]
-                               : magnitude / kExactPowersOfTen[-scale];
+    double scaled =
+        scale >= 0 ? magnitude * kExactPowersOfTen[scale] : magnitude / kExactPowersOfTen[-scale];
     int usedScale = scale;
     // The estimate is one too small when the value reaches the next power of ten (or rounds
     // to it). The scaling is not exact; a wrong guess only fails the check below.

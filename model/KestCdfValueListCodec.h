@@ -46,11 +46,11 @@ bool IsFormatType(const KestCdfNormalizedString& formatType, std::u16string_view
 /// a string. Throws _com_error when the value has no text form (an array, VT_NULL). The value
 /// must outlive this object and stay unchanged.
 class ValueText {
-public:
+  public:
     explicit ValueText(const VARIANT& value);
     std::u16string_view View() const noexcept { return m_view; }
 
-private:
+  private:
     _bstr_t m_converted;
     std::u16string_view m_view;
 };
@@ -63,7 +63,7 @@ _bstr_t TakeText(_variant_t value);
 /// text is neither copied nor freed, must outlive this object, and the callee must not change
 /// the value.
 class LentText {
-public:
+  public:
     explicit LentText(BSTR text) noexcept {
         m_value.vt = VT_BSTR;
         m_value.bstrVal = text;
@@ -73,7 +73,7 @@ public:
     LentText& operator=(const LentText&) = delete;
     const _variant_t& Get() const noexcept { return m_value; }
 
-private:
+  private:
     _variant_t m_value;
 };
 

@@ -143,9 +143,13 @@ IXMLDOMNodePtr IXMLDOMNode::GetparentNode() const {
     return IXMLDOMNodePtr(m_doc, m_node->parent);
 }
 
-IXMLDOMNodePtr IXMLDOMNode::GetfirstChild() const { return IXMLDOMNodePtr(m_doc, m_node->FirstChild()); }
+IXMLDOMNodePtr IXMLDOMNode::GetfirstChild() const {
+    return IXMLDOMNodePtr(m_doc, m_node->FirstChild());
+}
 
-IXMLDOMNodePtr IXMLDOMNode::GetlastChild() const { return IXMLDOMNodePtr(m_doc, m_node->LastChild()); }
+IXMLDOMNodePtr IXMLDOMNode::GetlastChild() const {
+    return IXMLDOMNodePtr(m_doc, m_node->LastChild());
+}
 
 IXMLDOMNodePtr IXMLDOMNode::GetnextSibling() const {
     if (m_node->Type() == NODE_ATTRIBUTE) return nullptr;

@@ -58,7 +58,7 @@ class IXMLDOMSchemaCollection;
 /// empty pointer when the node is not of that kind (as a failed QueryInterface would).
 template <class I>
 class DomPtr {
-public:
+  public:
     DomPtr() noexcept = default;
     DomPtr(std::nullptr_t) noexcept {}
     DomPtr(const DomPtr& other) noexcept : DomPtr(other.m_handle.m_doc, other.m_handle.m_node) {}
@@ -125,7 +125,7 @@ public:
         }
     }
 
-private:
+  private:
     template <class J>
     friend class DomPtr;
     mutable I m_handle;
@@ -146,7 +146,7 @@ using IXMLDOMSchemaCollectionPtr = ComPtr<IXMLDOMSchemaCollection>;
 
 /// Any node. Reached through a DomPtr.
 class IXMLDOMNode {
-public:
+  public:
     /// The node's kind.
     DOMNodeType GetnodeType() const;
     /// The qualified name as written; "#text", "#cdata-section", "#comment", "#document" for
@@ -194,7 +194,7 @@ public:
     /// Every node kind is accepted by this interface.
     static bool Accepts(const detail::DomNode* node) noexcept { return node != nullptr; }
 
-protected:
+  protected:
     template <class J>
     friend class DomPtr;
     friend struct detail::DomDocument;
@@ -206,7 +206,7 @@ protected:
 bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept;
 
 class IXMLDOMElement : public IXMLDOMNode {
-public:
+  public:
     /// The attribute with this qualified name, or an empty pointer.
     IXMLDOMAttributePtr getAttributeNode(const _bstr_t& name) const;
     /// The attribute's value as VT_BSTR, or VT_NULL when there is none.
@@ -220,28 +220,28 @@ public:
 };
 
 class IXMLDOMAttribute : public IXMLDOMNode {
-public:
+  public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_ATTRIBUTE);
     }
 };
 
 class IXMLDOMText : public IXMLDOMNode {
-public:
+  public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_TEXT) || DomNodeIs(node, NODE_CDATA_SECTION);
     }
 };
 
 class IXMLDOMComment : public IXMLDOMNode {
-public:
+  public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_COMMENT);
     }
 };
 
 class IXMLDOMProcessingInstruction : public IXMLDOMNode {
-public:
+  public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_PROCESSING_INSTRUCTION);
     }

@@ -83,11 +83,16 @@ const DomName kCommentName = MakeKindName(NODE_COMMENT, "#comment", false);
 
 const DomName* KindName(DOMNodeType type) noexcept {
     switch (type) {
-        case NODE_DOCUMENT: return &kDocumentName;
-        case NODE_TEXT: return &kTextName;
-        case NODE_CDATA_SECTION: return &kCdataName;
-        case NODE_COMMENT: return &kCommentName;
-        default: return nullptr;
+        case NODE_DOCUMENT:
+            return &kDocumentName;
+        case NODE_TEXT:
+            return &kTextName;
+        case NODE_CDATA_SECTION:
+            return &kCdataName;
+        case NODE_COMMENT:
+            return &kCommentName;
+        default:
+            return nullptr;
     }
 }
 

@@ -19,7 +19,7 @@ namespace detail {
 
 /// Chunked bump allocator. Memory is returned only when the arena dies.
 class Arena {
-public:
+  public:
     Arena() = default;
     Arena(const Arena&) = delete;
     Arena& operator=(const Arena&) = delete;
@@ -30,7 +30,7 @@ public:
     /// Bytes held by the arena's chunks.
     std::size_t Footprint() const noexcept { return m_footprint; }
 
-private:
+  private:
     struct FreeChunk {
         void operator()(char* p) const noexcept;
     };
@@ -104,7 +104,7 @@ struct DomNode {
         m_text.length = length;
     }
 
-private:
+  private:
     struct Links {
         DomNode* first;
         DomNode* last;

@@ -1,8 +1,8 @@
 #include <gtest/gtest.h>
 
 #include <climits>
-#include <functional>
 #include <cmath>
+#include <functional>
 #include <limits>
 #include <string>
 #include <vector>
@@ -72,7 +72,8 @@ KestCdfAxis ReadAxis(const char* xml) {
 IXMLDOMNodePtr WriteAxis(KestCdfAxis& axis, IXMLDOMDocument2Ptr& doc) {
     doc = LoadDocument("<CAL-ITEM/>");
     IXMLDOMNodePtr parent = doc->GetdocumentElement();
-    EXPECT_TRUE(axis.ConvertAxisNodeToXML(parent, doc.GetInterfacePtr(), KestCdfNormalizedString()));
+    EXPECT_TRUE(
+        axis.ConvertAxisNodeToXML(parent, doc.GetInterfacePtr(), KestCdfNormalizedString()));
     return parent->GetlastChild();
 }
 
@@ -119,21 +120,23 @@ TEST(KestCdfAxis, SplitsTextByFormatTypeAndWritesItBack) {
         {u"NUMERIC", u"0.00001 -0.0", {R8(1e-5), R8(-0.0)}, u"1.0e-005 -0"},
         {u"NUMERIC", u"1\t2\n3", {I4(1)}, u"1"},
         {u"NUMERIC", u"-7 +8 x 0x1A", {I4(-7), I4(8), I4(0), I4(0)}, u"-7 8 0 0"},
-        {u"NUMERIC", u"4294967296 -4294967296", {I4(INT_MAX), I4(INT_MIN)},
+        {u"NUMERIC",
+         u"4294967296 -4294967296",
+         {I4(INT_MAX), I4(INT_MIN)},
          u"2147483647 -2147483648"},
-        {u"NUMERIC", u"inf -INFINITY 1. 0x1p3", {R8(inf), R8(-inf), R8(1), R8(8)},
-         u"inf -inf 1 8"},
+        {u"NUMERIC", u"inf -INFINITY 1. 0x1p3", {R8(inf), R8(-inf), R8(1), R8(8)}, u"inf -inf 1 8"},
         {u"NUMERIC", u"nan 0.1", {R8(std::nan("")), R8(0.1)}, u"nan 0.1"},
         {u"NUMERIC", longToken + u" 7", {R8(1.0), R8(7)}, u"1 7"},
-        {u"NUMERIC", u"0.1 0.30000000000000004", {R8(0.1), R8(0.30000000000000004)},
-         u"0.1 0.3"},
+        {u"NUMERIC", u"0.1 0.30000000000000004", {R8(0.1), R8(0.30000000000000004)}, u"0.1 0.3"},
         {u"STRING", u"\"a b\" \"c\"", {Str(u"a b"), Str(u"c")}, u"\"a b\" \"c\""},
         {u"STRING", u"\"\" x \"y", {Str(u"")}, u"\"\""},
         {u"STRING", u"a b", {}, u""},
         {u"STRING", u"\"a b", {}, u""},
         {u"LABEL", u"1 2 \"x\"", {Str(u"1 2 \"x\"")}, u"1 2 \"x\""},
         {u"LABEL", u"", {Str(u"")}, u""},
-        {u"STRING", u"\"\u00e9\" \"\U0001F600 \u20ac\"", {Str(u"\u00e9"), Str(u"\U0001F600 \u20ac")},
+        {u"STRING",
+         u"\"\u00e9\" \"\U0001F600 \u20ac\"",
+         {Str(u"\u00e9"), Str(u"\U0001F600 \u20ac")},
          u"\"\u00e9\" \"\U0001F600 \u20ac\""},
         {u"LABEL", u"\u00e9 1", {Str(u"\u00e9 1")}, u"\u00e9 1"},
     };
@@ -284,8 +287,8 @@ TEST(KestCdfAxis, ReadsTheSizeAsATruncatedNumber) {
 }
 
 TEST(KestCdfAxis, TakesAttributesByPosition) {
-    KestCdfAxis axis = ReadAxis(
-        "<AXIS a=\"2\" b=\"A&#9;B&#10;C\" c=\"NUMERIC\" d=\"ignored\">1 2</AXIS>");
+    KestCdfAxis axis =
+        ReadAxis("<AXIS a=\"2\" b=\"A&#9;B&#10;C\" c=\"NUMERIC\" d=\"ignored\">1 2</AXIS>");
     EXPECT_EQ(2u, axis.GetSize());
     EXPECT_EQ(u"A B C", axis.GetSwUnits().ToU16String());
     ExpectElements(axis.GetAxisValue(), {I4(1), I4(2)});
@@ -293,8 +296,8 @@ TEST(KestCdfAxis, TakesAttributesByPosition) {
     axis.SetSwUnits(KestCdfNormalizedString(_bstr_t(u"A\tB")));
     EXPECT_EQ(u"A\tB", axis.GetSwUnits().ToU16String());
 
-    IXMLDOMDocument2Ptr doc = LoadDocument(
-        "<AXIS format-type=\"NUMERIC\" size=\"3\" sw-units=\"x\">1</AXIS>");
+    IXMLDOMDocument2Ptr doc =
+        LoadDocument("<AXIS format-type=\"NUMERIC\" size=\"3\" sw-units=\"x\">1</AXIS>");
     KestCdfAxis swapped;
     EXPECT_THROW(swapped.ConvertAxisNode(doc->GetdocumentElement()), _com_error);
 }
@@ -345,8 +348,8 @@ TEST(KestCdfAxis, ReaderFailures) {
 }
 
 TEST(KestCdfAxis, TheLastChildDecides) {
-    KestCdfAxis axis = ReadAxis(
-        "<AXIS size=\"1\" sw-units=\"\" format-type=\"NUMERIC\">1 2<!--3.5 4--></AXIS>");
+    KestCdfAxis axis =
+        ReadAxis("<AXIS size=\"1\" sw-units=\"\" format-type=\"NUMERIC\">1 2<!--3.5 4--></AXIS>");
     ExpectElements(axis.GetAxisValue(), {R8(3.5), R8(4)});
     KestCdfAxis empty = ReadAxis("<AXIS size=\"1\" sw-units=\"\" format-type=\"NUMERIC\"/>");
     EXPECT_EQ(VT_EMPTY, empty.GetAxisValue().vt);
@@ -378,9 +381,9 @@ TEST(KestCdfAxis, WriterFailures) {
     EXPECT_THROW(axis.ConvertAxisNodeToXML(IXMLDOMNodePtr(), doc.GetInterfacePtr(),
                                            KestCdfNormalizedString()),
                  _com_error);
-    EXPECT_THROW(axis.ConvertAxisNodeToXML(doc->GetdocumentElement(), nullptr,
-                                           KestCdfNormalizedString()),
-                 _com_error);
+    EXPECT_THROW(
+        axis.ConvertAxisNodeToXML(doc->GetdocumentElement(), nullptr, KestCdfNormalizedString()),
+        _com_error);
     EXPECT_FALSE(doc->GetdocumentElement()->hasChildNodes());
 }
 
@@ -396,7 +399,7 @@ TEST(KestCdfAxis, AHostAxisIsWrittenWithSizeZero) {
 TEST(KestCdfAxis, NumericTextReadFromTheDocumentIsSplitAsSetAxisValueSplitsIt) {
     for (const std::u16string& text : std::vector<std::u16string>{
              u"", u" ", u"\u00e9", u"\U0001F600", u"7", u" 1 2", u"1 2.5 3", u"1\u00e9 2 \u20ac.5",
-          u"\t3 4\n", u"1e5 2 3.5e-7", std::u16string(400, u'9') + u" 0.25"}) {
+             u"\t3 4\n", u"1e5 2 3.5e-7", std::u16string(400, u'9') + u" 0.25"}) {
         SCOPED_TRACE(Narrow(text));
         IXMLDOMDocument2Ptr doc =
             LoadDocument("<AXIS size=\"3\" sw-units=\"rpm\" format-type=\"NUMERIC\"/>");

@@ -119,9 +119,11 @@ TEST(KestCdfCalItemValue, StoresTextByFormatTypeAndOriginAndWritesItBack) {
         {true, u"NUMERIC", u"7", {R8(7)}, u"7"},
         {true, u"NUMERIC", u"1e5 2", {R8(1e5), I4(2)}, u"100000 2"},
         {true, u"NUMERIC", u"2 1e5 3.5e-7", {R8(2), I4(1), R8(3.5e-7)}, u"2 1 3.5e-007"},
-        {true, u"NUMERIC", u"1e20 -9999999999", {R8(1e20), I4(INT_MIN)},
-         u"1.0e+020 -2147483648"},
-        {true, u"NUMERIC", u"0.1 x 0.30000000000000004", {R8(0.1), I4(0), R8(0.30000000000000004)},
+        {true, u"NUMERIC", u"1e20 -9999999999", {R8(1e20), I4(INT_MIN)}, u"1.0e+020 -2147483648"},
+        {true,
+         u"NUMERIC",
+         u"0.1 x 0.30000000000000004",
+         {R8(0.1), I4(0), R8(0.30000000000000004)},
          u"0.1 0 0.3"},
         {true, u"NUMERIC", u"1.5 2,5", {R8(1.5), I4(2)}, u"1.5 2"},
         {true, u"STRING", u"\"a b\" \"c\"", {Str(u"a b"), Str(u"c")}, u"\"a b\" \"c\""},
@@ -130,8 +132,11 @@ TEST(KestCdfCalItemValue, StoresTextByFormatTypeAndOriginAndWritesItBack) {
         {true, u"STRING", u"\"a b", {Str(u"\"a b")}, u"\"a b"},
         {true, u"STRING", u"plain text", {Str(u"plain text")}, u"\"plain text\""},
         {true, u"LABEL", u"\"x\" y", {Str(u"\"x\" y")}, u"\"x\" y"},
-        {true, u"STRING", u"\"\u00e9 \U0001F600\" \"\u20ac\"",
-         {Str(u"\u00e9 \U0001F600"), Str(u"\u20ac")}, u"\"\u00e9 \U0001F600\" \"\u20ac\""},
+        {true,
+         u"STRING",
+         u"\"\u00e9 \U0001F600\" \"\u20ac\"",
+         {Str(u"\u00e9 \U0001F600"), Str(u"\u20ac")},
+         u"\"\u00e9 \U0001F600\" \"\u20ac\""},
         {false, u"LABEL", u"\u00e9\u20ac", {Str(u"\u00e9\u20ac")}, u"\u00e9\u20ac"},
         {true, u"OTHER", u"1 2", {Str(u"1 2")}, u"1 2"},
         {true, u"OTHER", u"\"q\"", {Str(u"seed")}, u"seed"},
@@ -208,8 +213,8 @@ TEST(KestCdfCalItemValue, TheFormatTypeMustComeFirst) {
 }
 
 TEST(KestCdfCalItemValue, CopiesAreIndependentAndKeepTheOrigin) {
-    KestCdfCalItemValue read = ReadValue(
-        "<VALUE sw-units-ref=\"Nm\" format-type=\"STRING\">\"a\" \"b\"</VALUE>");
+    KestCdfCalItemValue read =
+        ReadValue("<VALUE sw-units-ref=\"Nm\" format-type=\"STRING\">\"a\" \"b\"</VALUE>");
     KestCdfCalItemValue copy(read);
     KestCdfCalItemValue assigned;
     assigned = read;
@@ -241,13 +246,21 @@ TEST(KestCdfCalItemValue, TakesAttributesByPosition) {
         std::vector<Element> elements;
         const char* written;
     } rows[] = {
-        {"<VALUE format-type=\"NUMERIC\" sw-units-ref=\"rpm\">1 2</VALUE>", u"NUMERIC", u"rpm",
+        {"<VALUE format-type=\"NUMERIC\" sw-units-ref=\"rpm\">1 2</VALUE>",
+         u"NUMERIC",
+         u"rpm",
          {Str(u"1 2")},
          "<VALUE sw-units-ref=\"NUMERIC\" format-type=\"rpm\">1 2</VALUE>"},
-        {"<VALUE>1 2</VALUE>", u"Error occured", u"Error occured", {Str(u"1 2")},
+        {"<VALUE>1 2</VALUE>",
+         u"Error occured",
+         u"Error occured",
+         {Str(u"1 2")},
          "<VALUE sw-units-ref=\"Error occured\" format-type=\"Error occured\">1 2</VALUE>"},
         {"<VALUE u=\"a&#9;b&#13;&#10;c\">\"q\"</VALUE>", u"a b  c", u"Error occured", {}, ""},
-        {"<VALUE u=\"\" f=\"LABEL\" x=\"y\">z</VALUE>", u"", u"LABEL", {Str(u"z")},
+        {"<VALUE u=\"\" f=\"LABEL\" x=\"y\">z</VALUE>",
+         u"",
+         u"LABEL",
+         {Str(u"z")},
          "<VALUE sw-units-ref=\"\" format-type=\"LABEL\">z</VALUE>"},
     };
     for (const Row& row : rows) {
@@ -269,8 +282,8 @@ TEST(KestCdfCalItemValue, TakesAttributesByPosition) {
 }
 
 TEST(KestCdfCalItemValue, TheLastChildDecides) {
-    KestCdfCalItemValue value = ReadValue(
-        "<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">1 2<!--3 4.5--></VALUE>");
+    KestCdfCalItemValue value =
+        ReadValue("<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">1 2<!--3 4.5--></VALUE>");
     ExpectElements(value.GetValue(), {R8(3), R8(4.5)});
     KestCdfCalItemValue cdata = ReadValue(
         "<VALUE sw-units-ref=\"\" format-type=\"STRING\"><![CDATA[\"<a>\" \"&\"]]></VALUE>");
@@ -327,9 +340,10 @@ TEST(KestCdfCalItemValue, ReaderAndWriterFailures) {
 TEST(KestCdfCalItemValue, LongAndOverflowingTokens) {
     const std::u16string digits(400, u'9');
     KestCdfCalItemValue value = MakeValue(true, u"NUMERIC");
-    value.SetValue(_variant_t(u"0." + std::u16string(300, u'0') + u"5 " + digits + u" -" +
-                              digits + u" 0" + digits + u".0"));
-    ExpectElements(value.GetValue(), {R8(5e-301), I4(INT_MAX), I4(INT_MIN), R8(std::numeric_limits<double>::infinity())});
+    value.SetValue(_variant_t(u"0." + std::u16string(300, u'0') + u"5 " + digits + u" -" + digits +
+                              u" 0" + digits + u".0"));
+    ExpectElements(value.GetValue(), {R8(5e-301), I4(INT_MAX), I4(INT_MIN),
+                                      R8(std::numeric_limits<double>::infinity())});
 }
 
 TEST(KestCdfCalItemValue, EveryValueSurvivesAWriteAndARead) {
@@ -358,9 +372,10 @@ TEST(KestCdfCalItemValue, EveryValueSurvivesAWriteAndARead) {
 TEST(KestCdfCalItemValue, NumericTextReadFromTheDocumentIsSplitAsSetValueSplitsIt) {
     for (const std::u16string& text : std::vector<std::u16string>{
              u"", u" ", u"\u00e9", u"\U0001F600", u"7", u" 1 2", u"1 2.5 3", u"1\u00e9 2 \u20ac.5",
-          u"\t3 4\n", u"1e5 2 3.5e-7", std::u16string(400, u'9') + u" 0.25"}) {
+             u"\t3 4\n", u"1e5 2 3.5e-7", std::u16string(400, u'9') + u" 0.25"}) {
         SCOPED_TRACE(Narrow(text));
-        IXMLDOMDocument2Ptr doc = LoadDocument("<VALUE sw-units-ref=\"u\" format-type=\"NUMERIC\"/>");
+        IXMLDOMDocument2Ptr doc =
+            LoadDocument("<VALUE sw-units-ref=\"u\" format-type=\"NUMERIC\"/>");
         IXMLDOMNodePtr element = doc->GetdocumentElement();
         IXMLDOMNodePtr child =
             doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));

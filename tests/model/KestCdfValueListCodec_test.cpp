@@ -2,6 +2,8 @@
 // the C locale (the rules they promise), the tokenizer and the text builder on their own.
 #include <gtest/gtest.h>
 
+#include <locale.h>
+#include <stdlib.h>
 #include <climits>
 #include <clocale>
 #include <cmath>
@@ -10,9 +12,7 @@
 #include <cstring>
 #include <functional>
 #include <limits>
-#include <locale.h>
 #include <random>
-#include <stdlib.h>
 #include <string>
 #include <vector>
 
@@ -64,21 +64,88 @@ std::string Format(double value) {
     return std::string(buffer, FormatDouble(value, buffer));
 }
 
-double Atof(const std::string& token) { return ParseDouble(token.data(), token.data() + token.size()); }
+double Atof(const std::string& token) {
+    return ParseDouble(token.data(), token.data() + token.size());
+}
 int Atoi(const std::string& token) { return ParseInt(token.data(), token.data() + token.size()); }
 
 std::vector<std::string> TrickyTokens() {
     std::vector<std::string> tokens = {
-        "", " ", "\t5", "\n\v\f\r7", "+", "-", "+-1", "-+1", ".", "-.", "+.e5", ".5", "5.",
-        "-0", "+0.0", "-0.0e9", "1e", "1e+", "1e-", "1e-5", "1E5", "1e5x", "1.5e3.2", "1..2",
-        "0x", "0x1p3", "0X1P-2", "-0x.8", "0x1p", "0xg", "0x1.fffffffffffff8p1023", "inf",
-        "INF", "-Infinity", "infin", "infinityx", "in", "nan", "NaN(123)", "nan(", "nan()",
-        "nan(a_b)", "-nan", "n", "1e400", "-1e400", "1e-400", "4.9e-324", "2.4703282292062328e-324",
-        "2.2250738585072011e-308", "123456789012345678901234567890", "0.1", "9007199254740993",
-        "1,5", "abc", "\x7f" "1", "00012", "1_000", "2147483647", "2147483648", "-2147483648",
-        "-2147483649", "99999999999999999999", "-99999999999999999999", "  42abc", "1e5",
-        "0.30000000000000004", "1.7976931348623157e308", "1.7976931348623159e308", "e5", "-e5",
-        std::string("1\0" "2", 3),
+        "",
+        " ",
+        "\t5",
+        "\n\v\f\r7",
+        "+",
+        "-",
+        "+-1",
+        "-+1",
+        ".",
+        "-.",
+        "+.e5",
+        ".5",
+        "5.",
+        "-0",
+        "+0.0",
+        "-0.0e9",
+        "1e",
+        "1e+",
+        "1e-",
+        "1e-5",
+        "1E5",
+        "1e5x",
+        "1.5e3.2",
+        "1..2",
+        "0x",
+        "0x1p3",
+        "0X1P-2",
+        "-0x.8",
+        "0x1p",
+        "0xg",
+        "0x1.fffffffffffff8p1023",
+        "inf",
+        "INF",
+        "-Infinity",
+        "infin",
+        "infinityx",
+        "in",
+        "nan",
+        "NaN(123)",
+        "nan(",
+        "nan()",
+        "nan(a_b)",
+        "-nan",
+        "n",
+        "1e400",
+        "-1e400",
+        "1e-400",
+        "4.9e-324",
+        "2.4703282292062328e-324",
+        "2.2250738585072011e-308",
+        "123456789012345678901234567890",
+        "0.1",
+        "9007199254740993",
+        "1,5",
+        "abc",
+        "\x7f"
+        "1",
+        "00012",
+        "1_000",
+        "2147483647",
+        "2147483648",
+        "-2147483648",
+        "-2147483649",
+        "99999999999999999999",
+        "-99999999999999999999",
+        "  42abc",
+        "1e5",
+        "0.30000000000000004",
+        "1.7976931348623157e308",
+        "1.7976931348623159e308",
+        "e5",
+        "-e5",
+        std::string("1\0"
+                    "2",
+                    3),
     };
     tokens.push_back(std::string(200, '0') + "1");
     tokens.push_back("1" + std::string(200, '0'));
@@ -248,7 +315,8 @@ TEST(KestCdfValueListCodec, FormatsMillionsOfDoublesExactlyLikePrintf) {
              for (int e = -25; e <= 25; ++e)
                  for (int k = 0; k <= 2000; ++k) {
                      char text[64];
-                     std::snprintf(text, sizeof text, "%.15g", k * (100.0 / 255) * std::pow(10.0, e));
+                     std::snprintf(text, sizeof text, "%.15g",
+                                   k * (100.0 / 255) * std::pow(10.0, e));
                      withNeighbours(fromText(text), check);
                  }
          }},
@@ -269,7 +337,8 @@ TEST(KestCdfValueListCodec, FormatsMillionsOfDoublesExactlyLikePrintf) {
          [&](const auto& check) {
              for (int i = 0; i < 250000; ++i) {
                  char text[64];
-                 const unsigned long long digits = 100000000000000ull + random() % 900000000000000ull;
+                 const unsigned long long digits =
+                     100000000000000ull + random() % 900000000000000ull;
                  const int exponent = i % 4 ? static_cast<int>(random() % 80) - 40
                                             : static_cast<int>(random() % 600) - 300;
                  std::snprintf(text, sizeof text, "%llu5e%d", digits, exponent);
@@ -308,9 +377,9 @@ TEST(KestCdfValueListCodec, CountsSpacesOnlyForNumericText) {
         std::u16string text;
         int count;
     } rows[] = {
-        {true, u"", 1},         {true, u"1", 1},      {true, u"1 2 3", 3},
-        {true, u" 1 2", 3},     {true, u"1  2", 3},   {true, u"1 2 ", 3},
-        {true, u"1\t2\n3", 1},  {false, u"1 2 3", 0}, {false, u"", 0},
+        {true, u"", 1},        {true, u"1", 1},      {true, u"1 2 3", 3},
+        {true, u" 1 2", 3},    {true, u"1  2", 3},   {true, u"1 2 ", 3},
+        {true, u"1\t2\n3", 1}, {false, u"1 2 3", 0}, {false, u"", 0},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(std::string(row.text.begin(), row.text.end()));
@@ -334,8 +403,8 @@ std::vector<_variant_t> Elements(const VARIANT& array) {
 
 TEST(KestCdfValueListCodec, TokensOfAnyLengthParseByTheirLeadingCharacters) {
     const std::string zeros(300, '0');
-    const std::u16string text = u"0" + std::u16string(zeros.begin(), zeros.end()) + u"7 " +
-                                u"1" + std::u16string(zeros.begin(), zeros.end()) + u" 5";
+    const std::u16string text = u"0" + std::u16string(zeros.begin(), zeros.end()) + u"7 " + u"1" +
+                                std::u16string(zeros.begin(), zeros.end()) + u" 5";
     _variant_t array = NewValueArray(3);
     FillNumbers(text, NumberTyping::kWholeText, array);
     std::vector<_variant_t> elements = Elements(array);
@@ -421,8 +490,7 @@ TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
 
     _variant_t axis = FormatValueList(array, ElementWriting::kAxis, false);
     ASSERT_EQ(VT_BSTR, axis.vt);
-    EXPECT_EQ(u"1.0e+020 0.100000001490116 -42 a b 0 7 -1",
-              std::u16string(BstrView(axis.bstrVal)));
+    EXPECT_EQ(u"1.0e+020 0.100000001490116 -42 a b 0 7 -1", std::u16string(BstrView(axis.bstrVal)));
     _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue, false);
     EXPECT_EQ(u"1.0e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
 }
@@ -530,8 +598,8 @@ std::string Utf8List(const VARIANT& stored, ElementWriting writing, bool quoteSt
 _variant_t ArrayOf(const std::vector<_variant_t>& elements) {
     _variant_t array = NewValueArray(static_cast<ULONG>(elements.size()));
     for (LONG i = 0; i < static_cast<LONG>(elements.size()); ++i)
-        EXPECT_EQ(S_OK, SafeArrayPutElement(array.parray, &i,
-                                            const_cast<_variant_t*>(&elements[i])));
+        EXPECT_EQ(S_OK,
+                  SafeArrayPutElement(array.parray, &i, const_cast<_variant_t*>(&elements[i])));
     return array;
 }
 
@@ -563,9 +631,9 @@ TEST(KestCdfValueListCodec, Utf8ListIsTheUtf8OfTheUtf16List) {
         const _variant_t array = ArrayOf(rows[row]);
         for (ElementWriting writing : {ElementWriting::kAxis, ElementWriting::kCalItemValue}) {
             for (bool quote : {false, true}) {
-                SCOPED_TRACE(::testing::Message() << "row " << row << " axis "
-                                                  << (writing == ElementWriting::kAxis)
-                                                  << " quote " << quote);
+                SCOPED_TRACE(::testing::Message()
+                             << "row " << row << " axis " << (writing == ElementWriting::kAxis)
+                             << " quote " << quote);
                 const _variant_t utf16 = FormatValueList(array, writing, quote);
                 EXPECT_EQ(Utf8List(array, writing, quote), Utf16ToUtf8(BstrView(utf16.bstrVal)));
             }
@@ -589,12 +657,24 @@ TEST(KestCdfValueListCodec, Utf8ListOfRandomStringsMatchesTheConversion) {
             const int length = static_cast<int>(random() % (round % 10 == 0 ? 400 : 12));
             for (int i = 0; i < length; ++i) {
                 switch (kind(random)) {
-                case 0: text += static_cast<char16_t>(0x20 + random() % 0x5f); break;
-                case 1: text += static_cast<char16_t>(0x80 + random() % 0x780); break;
-                case 2: text += static_cast<char16_t>(0x800 + random() % 0xD000); break;
-                case 3: text += static_cast<char16_t>(0xD800 + random() % 0x400); break;
-                case 4: text += static_cast<char16_t>(0xDC00 + random() % 0x400); break;
-                default: text += static_cast<char16_t>(0xE000 + random() % 0x2000); break;
+                    case 0:
+                        text += static_cast<char16_t>(0x20 + random() % 0x5f);
+                        break;
+                    case 1:
+                        text += static_cast<char16_t>(0x80 + random() % 0x780);
+                        break;
+                    case 2:
+                        text += static_cast<char16_t>(0x800 + random() % 0xD000);
+                        break;
+                    case 3:
+                        text += static_cast<char16_t>(0xD800 + random() % 0x400);
+                        break;
+                    case 4:
+                        text += static_cast<char16_t>(0xDC00 + random() % 0x400);
+                        break;
+                    default:
+                        text += static_cast<char16_t>(0xE000 + random() % 0x2000);
+                        break;
                 }
             }
             elements.push_back(e % 3 == 2 ? _variant_t(random() / 7.0) : Str(text));
@@ -610,13 +690,34 @@ TEST(KestCdfValueListCodec, Utf8ListOfRandomStringsMatchesTheConversion) {
 TEST(KestCdfValueListCodec, NumbersFromUtf8AreThoseFromUtf16) {
     const std::u16string longDigits = u"1." + std::u16string(300, u'0') + u"1";
     const std::vector<std::u16string> texts = {
-        u"", u" ", u"  ", u"1", u"1 2.5 3", u" 1 2", u"1 2 ", u"1  2", u"1\t2 3\n4",
-        u"\t5 \v6", u"\u00e9", u"\u20ac", u"\U0001F600", u"\u00e9 1", u"1\u00e9 2.5\u20ac",
-        u"\u00a05 \u00855 \u30005", u"-\u00e91 +\u00e9.5", u"1.5\U0001F600e3 7",
-        u"1e\u00e95 2", u"0x1\u00e9p3 0x\u00e9", u"inf\u00e9 nan(\u00e9) nan(a\u00e9b) in\u00e9f",
-        u"\u00e9 \u00e9 \u00e9", longDigits + u"\u00e9 " + longDigits, u"1." + longDigits,
-        std::u16string(u"1\0 2", 4), u"2147483648 -2147483649 1e400 4.9e-324",
-        std::u16string(3000, u'\u20ac') + u" 8", std::u16string(1, u'\xD800') + u"5",
+        u"",
+        u" ",
+        u"  ",
+        u"1",
+        u"1 2.5 3",
+        u" 1 2",
+        u"1 2 ",
+        u"1  2",
+        u"1\t2 3\n4",
+        u"\t5 \v6",
+        u"\u00e9",
+        u"\u20ac",
+        u"\U0001F600",
+        u"\u00e9 1",
+        u"1\u00e9 2.5\u20ac",
+        u"\u00a05 \u00855 \u30005",
+        u"-\u00e91 +\u00e9.5",
+        u"1.5\U0001F600e3 7",
+        u"1e\u00e95 2",
+        u"0x1\u00e9p3 0x\u00e9",
+        u"inf\u00e9 nan(\u00e9) nan(a\u00e9b) in\u00e9f",
+        u"\u00e9 \u00e9 \u00e9",
+        longDigits + u"\u00e9 " + longDigits,
+        u"1." + longDigits,
+        std::u16string(u"1\0 2", 4),
+        u"2147483648 -2147483649 1e400 4.9e-324",
+        std::u16string(3000, u'\u20ac') + u" 8",
+        std::u16string(1, u'\xD800') + u"5",
     };
     for (const std::u16string& text : texts) {
         const std::string utf8 = Utf16ToUtf8(text);

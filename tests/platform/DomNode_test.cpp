@@ -180,8 +180,8 @@ TEST(DomNode, CreateNodeMakesEachKind) {
 }
 
 TEST(DomNode, Utf8ValuesAreTheStoredTextOfTheUtf16Ones) {
-    IXMLDOMDocument2Ptr doc =
-        Parsed("<?xml version='1.0'?><a b='\xC3\xA9'>t\xE2\x82\xAC<![CDATA[c]]><!--k--><?p d?></a>");
+    IXMLDOMDocument2Ptr doc = Parsed(
+        "<?xml version='1.0'?><a b='\xC3\xA9'>t\xE2\x82\xAC<![CDATA[c]]><!--k--><?p d?></a>");
     IXMLDOMElementPtr root = doc->GetdocumentElement();
     std::string_view view;
     EXPECT_FALSE(root->GetnodeValueUtf8(view));
