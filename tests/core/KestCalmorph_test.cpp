@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 #include <pthread.h>
 
+#include <cstdlib>
 #include <functional>
 #include <sstream>
 #include <string>
@@ -240,6 +241,18 @@ TEST(KestCalmorph, ReadsTheSampleAndWritesItBackFieldForField) {
     EXPECT_NE(text.substr(0, text.find("?>")).find("encoding=\"UTF-8\""), std::string::npos);
     EXPECT_NE(text.find("><!--c--><CHANGE-HISTORY>"), std::string::npos);
     EXPECT_NE(text.find(note), std::string::npos);
+
+    // Any XML tool agrees: xmllint accepts the written file and refuses it without FILENAME.
+    if (std::system("xmllint --version > /dev/null 2>&1") == 0) {
+        const std::string xsd = dir / "cdf.xsd", broken = dir / "broken.cdf";
+        const std::string lint = "xmllint --noout --schema '" + xsd + "' ";
+        EXPECT_EQ(std::system((lint + "'" + first + "' 2> /dev/null").c_str()), 0);
+        const std::size_t from = text.find("<FILENAME>");
+        const std::size_t to = text.find("</FILENAME>") + std::string("</FILENAME>").size();
+        ASSERT_NE(from, std::string::npos);
+        test::WriteWholeFile(broken, text.substr(0, from) + text.substr(to));
+        EXPECT_NE(std::system((lint + "'" + broken + "' 2> /dev/null").c_str()), 0);
+    }
 
     KestCalmorph rereader;
     KestCdfCalData reread = Read(rereader, first);
