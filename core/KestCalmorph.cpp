@@ -16,9 +16,8 @@ constexpr std::u16string_view kSkippedChangeHistory = u"CHANGE-HISTORY";
 constexpr std::u16string_view kSkippedCalItem = u"CAL-ITEM";
 constexpr std::u16string_view kCalDataName = u"CAL-DATA";
 
-bool IsSkippedSubtree(const _bstr_t& name) noexcept {
-    std::u16string_view view = name.View();
-    return view == kSkippedChangeHistory || view == kSkippedCalItem;
+bool IsSkippedSubtree(const IXMLDOMNodePtr& node) {
+    return node->NameIs(kSkippedChangeHistory) || node->NameIs(kSkippedCalItem);
 }
 
 // Clears the converter's write-document field and current node when a write ends, however it
@@ -133,7 +132,7 @@ long KestCalmorph::VisitCalDataNodes(IXMLDOMNodePtr node) {
                 pending.pop_back();
                 continue;
             }
-            if (IsSkippedSubtree(child->GetnodeName())) continue;
+            if (IsSkippedSubtree(child)) continue;
 
             ConvertXMLNode(child);
             if (IXMLDOMNamedNodeMapPtr attributes = child->Getattributes()) {
@@ -154,7 +153,7 @@ long KestCalmorph::VisitCalDataNodes(IXMLDOMNodePtr node) {
 
 const OLECHAR* KestCalmorph::ConvertXMLNode(IXMLDOMNodePtr node) {
     if (!node) throw _com_error(E_POINTER);
-    if (node->GetnodeType() == NODE_ELEMENT && node->GetnodeName().View() == kCalDataName) {
+    if (node->GetnodeType() == NODE_ELEMENT && node->NameIs(kCalDataName)) {
         m_calData.SetNodeAttributes(node->Getattributes());
         if (!m_calData.ConvertCalDataNode(node)) throw KestCalmorphDLLError();
     }

@@ -54,7 +54,7 @@ int KestCdfCalData::CountCalList(IXMLDOMNodePtr node) {
     int count = 0;
     try {
         while (IXMLDOMNodePtr child = children->nextNode()) {
-            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"CAL-LIST") {
+            if (child->GetnodeType() == NODE_ELEMENT && child->NameIs(u"CAL-LIST")) {
                 ++count;
             }
         }
@@ -66,16 +66,17 @@ int KestCdfCalData::CountCalList(IXMLDOMNodePtr node) {
 
 void KestCdfCalData::ReadChild(IXMLDOMNodePtr child, int& listIndex) {
     if (child->GetnodeType() != NODE_ELEMENT) return;
-    _bstr_t name = child->GetnodeName();
-    if (name == u"CHANGE-HISTORY") {
+    const IXMLDOMNode& element = *child;
+    auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };
+    if (named(u"CHANGE-HISTORY")) {
         m_changeHistory.ConvertChangeHistoryNode(child);
-    } else if (name == u"FILENAME") {
+    } else if (named(u"FILENAME")) {
         m_fileName.m_string = ElementText(child);
-    } else if (name == u"COMPANY-INFO") {
+    } else if (named(u"COMPANY-INFO")) {
         m_company.m_string = ElementText(child);
-    } else if (name == u"NOTE") {
+    } else if (named(u"NOTE")) {
         m_note = ElementText(child);
-    } else if (name == u"CAL-LIST") {
+    } else if (named(u"CAL-LIST")) {
         if (listIndex < m_calListSize) m_calLists.get()[listIndex++].ConvertCalListNode(child);
     }
 }

@@ -21,7 +21,7 @@ int KestCdfCalItem::CountAxisNodes(IXMLDOMNodePtr node) {
     int count = 0;
     try {
         while (IXMLDOMNodePtr child = children->nextNode()) {
-            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"AXIS") ++count;
+            if (child->GetnodeType() == NODE_ELEMENT && child->NameIs(u"AXIS")) ++count;
         }
     } catch (...) {
         // -1 makes the allocation that follows fail, which the list reader reports.
@@ -32,8 +32,9 @@ int KestCdfCalItem::CountAxisNodes(IXMLDOMNodePtr node) {
 
 void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
     if (child->GetnodeType() != NODE_ELEMENT) return;
-    _bstr_t name = child->GetnodeName();
-    if (name == u"NAME") {
+    const IXMLDOMNode& element = *child;
+    auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };
+    if (named(u"NAME")) {
         // The last child node stands; no child gives an empty (not null) name.
         CComBSTR text(std::u16string_view{});
         IXMLDOMNodeListPtr parts = child->GetchildNodes();
@@ -41,14 +42,14 @@ void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
             while (IXMLDOMNodePtr part = parts->nextNode()) text = TextOf(part);
         }
         m_name.m_string = std::move(text);
-    } else if (name == u"AXIS") {
+    } else if (named(u"AXIS")) {
         if (axisIndex < m_axisSize) m_axes.get()[axisIndex++].ConvertAxisNode(child);
-    } else if (name == u"VALUE") {
+    } else if (named(u"VALUE")) {
         m_value.AllocateObject()->ConvertCalItemValueNode(child);
-    } else if (name == u"ANNOTATION") {
+    } else if (named(u"ANNOTATION")) {
         // Only the first child node counts; an empty element leaves the annotation alone.
         if (IXMLDOMNodePtr first = child->GetfirstChild()) m_annotation = TextOf(first);
-    } else if (name == u"NOTE") {
+    } else if (named(u"NOTE")) {
         IXMLDOMNodePtr first = child->GetfirstChild();
         m_note = first ? TextOf(first) : CComBSTR(std::u16string_view{});
     }

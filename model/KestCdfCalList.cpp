@@ -32,7 +32,7 @@ int KestCdfCalList::CountCalItem(IXMLDOMNodePtr node) {
     int count = 0;
     try {
         while (IXMLDOMNodePtr child = children->nextNode()) {
-            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"CAL-ITEM") {
+            if (child->GetnodeType() == NODE_ELEMENT && child->NameIs(u"CAL-ITEM")) {
                 ++count;
             }
         }
@@ -44,15 +44,16 @@ int KestCdfCalList::CountCalItem(IXMLDOMNodePtr node) {
 }
 
 void KestCdfCalList::ReadChild(IXMLDOMNodePtr child, int& itemIndex) {
-    _bstr_t name = child->GetnodeName();
-    if (name == u"NAME") {
+    const IXMLDOMNode& element = *child;
+    auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };
+    if (named(u"NAME")) {
         // Only the first child node counts; an empty element leaves the name alone.
         if (IXMLDOMNodePtr first = child->GetfirstChild()) m_name.m_string = TextOf(first);
-    } else if (name == u"SYMBOLIC-FILE") {
+    } else if (named(u"SYMBOLIC-FILE")) {
         m_symbolicFile.AllocateObject()->ConvertSymbolicFileNode(child);
-    } else if (name == u"TARGET-IMAGE") {
+    } else if (named(u"TARGET-IMAGE")) {
         m_targetImage.AllocateObject()->ConvertTargetImageFileNode(child);
-    } else if (name == u"NOTE") {
+    } else if (named(u"NOTE")) {
         // The last child node stands; no child gives an empty (not null) note.
         CComBSTR text(std::u16string_view{});
         IXMLDOMNodeListPtr parts = child->GetchildNodes();
@@ -60,7 +61,7 @@ void KestCdfCalList::ReadChild(IXMLDOMNodePtr child, int& itemIndex) {
             while (IXMLDOMNodePtr part = parts->nextNode()) text = TextOf(part);
         }
         m_note = std::move(text);
-    } else if (name == u"CAL-ITEM") {
+    } else if (named(u"CAL-ITEM")) {
         if (itemIndex < m_calItemSize) m_calItems.get()[itemIndex++].ConvertCalItemNode(child);
     }
 }

@@ -41,13 +41,16 @@ bool KestCdfChange::ConvertChangeNode(IXMLDOMNodePtr node) {
     try {
         while (IXMLDOMNodePtr child = children->nextNode()) {
             if (child->GetnodeType() != NODE_ELEMENT) continue;
-            _bstr_t name = child->GetnodeName();
-            if (name == kUserName) {
+            const IXMLDOMNode& element = *child;
+            auto named = [&element](std::u16string_view candidate) {
+                return element.NameIs(candidate);
+            };
+            if (named(kUserName)) {
                 IXMLDOMNodePtr first = child->GetfirstChild();
                 if (first) {
                     m_userName.m_string = CComBSTR(_bstr_t(first->GetnodeValue()).View());
                 }
-            } else if (name == kDate) {
+            } else if (named(kDate)) {
                 IXMLDOMNodeListPtr parts = child->GetchildNodes();
                 if (!parts) continue;
                 while (IXMLDOMNodePtr part = parts->nextNode()) {
@@ -55,13 +58,13 @@ bool KestCdfChange::ConvertChangeNode(IXMLDOMNodePtr node) {
                     date.SetDate(CComBSTR(_bstr_t(part->GetnodeValue()).View()));
                     m_date = date;
                 }
-            } else if (name == kTool || name == kNote || name == kDataVersion) {
+            } else if (named(kTool) || named(kNote) || named(kDataVersion)) {
                 bool found = false;
                 CComBSTR text = LastChildText(child, found);
                 if (!found) continue;
-                if (name == kTool) {
+                if (named(kTool)) {
                     m_tool = std::move(text);
-                } else if (name == kNote) {
+                } else if (named(kNote)) {
                     m_note = std::move(text);
                 } else {
                     m_dataVersion.m_string = std::move(text);

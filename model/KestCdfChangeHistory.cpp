@@ -16,7 +16,7 @@ int KestCdfChangeHistory::CountChangeNodes(IXMLDOMNodePtr node) {
     int count = 0;
     try {
         while (IXMLDOMNodePtr child = children->nextNode()) {
-            if (child->GetnodeType() == NODE_ELEMENT && child->GetnodeName() == u"CHANGE") {
+            if (child->GetnodeType() == NODE_ELEMENT && child->NameIs(u"CHANGE")) {
                 ++count;
             }
         }
@@ -34,7 +34,7 @@ bool KestCdfChangeHistory::ConvertChangeHistoryNode(IXMLDOMNodePtr node) {
     if (!children) return true;
     int index = 0;
     while (IXMLDOMNodePtr child = children->nextNode()) {
-        if (child->GetnodeType() != NODE_ELEMENT || child->GetnodeName() != u"CHANGE") continue;
+        if (child->GetnodeType() != NODE_ELEMENT || !child->NameIs(u"CHANGE")) continue;
         if (index >= m_count) break;  // the children changed since they were counted
         changes[index++].ConvertChangeNode(child);
     }

@@ -46,6 +46,18 @@ _bstr_t IXMLDOMNode::GetnodeName() const {
     return ToBstr(m_node->Name());  // kinds without a name have "#text", "#comment", ...
 }
 
+bool IXMLDOMNode::NameIs(std::u16string_view name) const {
+    const std::string_view own = m_node->Name();
+    bool ascii = true;
+    for (char16_t c : name) ascii = ascii && c < 0x80;
+    if (!ascii) return Utf8ToUtf16(own) == name;
+    if (own.size() != name.size()) return false;
+    for (std::size_t i = 0; i < name.size(); ++i) {
+        if (static_cast<unsigned char>(own[i]) != name[i]) return false;
+    }
+    return true;
+}
+
 _variant_t IXMLDOMNode::GetnodeValue() const {
     switch (m_node->Type()) {
         case NODE_ATTRIBUTE:

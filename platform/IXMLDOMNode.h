@@ -152,6 +152,9 @@ class IXMLDOMNode {
     /// The qualified name as written; "#text", "#cdata-section", "#comment", "#document" for
     /// nodes without a name.
     _bstr_t GetnodeName() const;
+    /// Extension: true when the node's name (as GetnodeName gives it) equals `name`, without
+    /// building a string; readers test every child's name this way.
+    bool NameIs(std::u16string_view name) const;
     /// The text of an attribute, text, CDATA section, comment or processing instruction as
     /// VT_BSTR; VT_NULL for elements and documents.
     _variant_t GetnodeValue() const;

@@ -218,3 +218,26 @@ TEST(DomNode, Utf8ValuesAreTheStoredTextOfTheUtf16Ones) {
     EXPECT_EQ(Utf8Of(_bstr_t(declaration->GetnodeValue())), "version=\"1.0\" encoding=\"UTF-8\"");
     EXPECT_NE(CodeOf([&] { declaration->PutnodeValueUtf8("no pseudo-attributes"); }), S_OK);
 }
+
+TEST(DomNode, NameIsComparesTheNameAsWritten) {
+    IXMLDOMDocument2Ptr doc = Parsed("<p:CAL-ITEM xmlns:p=\"urn:x\"><Grö/>t</p:CAL-ITEM>");
+    IXMLDOMNodePtr root = doc->GetdocumentElement();
+    const struct {
+        IXMLDOMNodePtr node;
+        std::u16string_view name;
+        bool equal;
+    } rows[] = {
+        {root, u"p:CAL-ITEM", true},
+        {root, u"CAL-ITEM", false},
+        {root, u"p:CAL-ITEMS", false},
+        {root, u"p:cal-item", false},
+        {root->GetfirstChild(), u"Grö", true},
+        {root->GetfirstChild(), u"Gro", false},
+        {root->GetlastChild(), u"#text", true},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(Utf16ToUtf8(row.name));
+        EXPECT_EQ(row.node->NameIs(row.name), row.equal);
+        EXPECT_EQ(row.node->GetnodeName() == _bstr_t(std::u16string(row.name)), row.equal);
+    }
+}
