@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "model/KestCdfValueListCodec.h"
+#include "support/GermanLocale.h"
 
 using namespace kest;
 using namespace kest::detail;
@@ -569,9 +570,9 @@ TEST(KestCdfValueListCodec, IndexesTheArrayCannotDeliverAddNothing) {
 }
 
 TEST(KestCdfValueListCodec, IgnoresTheProcessLocale) {
-    const std::string previous = std::setlocale(LC_ALL, nullptr);
-    if (!std::setlocale(LC_ALL, "de_DE.UTF-8"))
-        GTEST_SKIP() << "the locale de_DE.UTF-8 is not installed on this machine";
+    test::GermanLocale german;
+    if (!german.Active())
+        GTEST_SKIP() << "no German locale is installed and localedef could not build one";
     char printed[8];
     std::snprintf(printed, sizeof printed, "%.1f", 2.5);
     EXPECT_STREQ("2,5", printed) << "the locale does not change the C library's separator";
@@ -582,7 +583,7 @@ TEST(KestCdfValueListCodec, IgnoresTheProcessLocale) {
     _variant_t array = NewValueArray(2);
     FillNumbers(u"0.25 1e-5", NumberTyping::kPerToken, array);
     _variant_t text = FormatValueList(array, ElementWriting::kCalItemValue, false);
-    std::setlocale(LC_ALL, previous.c_str());
+    german.Restore();
     EXPECT_EQ(u"0.25 1", std::u16string(BstrView(text.bstrVal)));
 }
 

@@ -1,4 +1,5 @@
 #include "platform/Variant.h"
+#include "support/GermanLocale.h"
 
 #include <gtest/gtest.h>
 
@@ -268,35 +269,15 @@ TEST(Variant, CopyAndClear) {
 }
 
 TEST(Variant, ConversionIgnoresTheProcessLocale) {
-    // A locale with ',' as its decimal separator; built on the fly if it is not installed.
-    const char* name = "de_DE.UTF-8";
-    std::string previous = std::setlocale(LC_ALL, nullptr);
-    std::string dir;
-    if (!std::setlocale(LC_ALL, name)) {
-        // One folder per process: test runs in parallel must not write the same files.
-        dir = testing::TempDir() + "kest-locales-" + std::to_string(getpid());
-        std::string command = "mkdir -p '" + dir + "' && localedef -i de_DE -f UTF-8 '" + dir +
-                              "/" + name + "' >/dev/null 2>&1";
-        if (std::system(command.c_str()) == 0) {
-            setenv("LOCPATH", dir.c_str(), 1);
-            std::setlocale(LC_ALL, name);
-        }
-    }
-    struct RemoveDir {
-        const std::string& dir;
-        ~RemoveDir() {
-            if (!dir.empty()) static_cast<void>(std::system(("rm -rf '" + dir + "'").c_str()));
-        }
-    } removeDir{dir};
-    if (std::string(std::setlocale(LC_ALL, nullptr)) != name) {
+    test::GermanLocale german;  // ',' as decimal separator
+    if (!german.Active())
         GTEST_SKIP() << "no German locale is installed and localedef could not build one";
-    }
     char probe[16];
     std::snprintf(probe, sizeof probe, "%.1f", 2.5);
     std::u16string text = TextOf(Var(1234.5)), dotText, commaText;
     HRESULT dotHr = Convert(Var(u"1234.5"), VT_R8, &dotText);
     HRESULT commaHr = Convert(Var(u"1234,5"), VT_R8, &commaText);
-    std::setlocale(LC_ALL, previous.c_str());
+    german.Restore();
 
     ASSERT_STREQ(probe, "2,5") << "the German locale did not switch printf to ','";
     EXPECT_EQ(text, u"1234.5");
