@@ -6,56 +6,15 @@
 #include <string>
 #include <vector>
 
+#include "ValueListTestUtil.h"
 #include "core/KestCalmorphDLLError.h"
 #include "model/KestCdfCalItemValue.h"
 #include "platform/XmlDom.h"
 
 using namespace kest;
+using namespace kest::test;
 
 namespace {
-
-struct Element {
-    VARTYPE vt;
-    double number;
-    std::u16string text;
-};
-Element I4(int v) { return {VT_I4, static_cast<double>(v), {}}; }
-Element R8(double v) { return {VT_R8, v, {}}; }
-Element Str(std::u16string v) { return {VT_BSTR, 0, std::move(v)}; }
-Element Empty() { return {VT_EMPTY, 0, {}}; }
-
-void ExpectElements(const _variant_t& value, const std::vector<Element>& expected) {
-    ASSERT_EQ(VT_ARRAY | VT_VARIANT, value.vt);
-    LONG lower = -1;
-    ASSERT_EQ(S_OK, SafeArrayGetLBound(value.parray, 1, &lower));
-    EXPECT_EQ(0, lower);
-    ASSERT_EQ(expected.size(), value.parray->rgsabound[0].cElements);
-    for (LONG i = 0; i < static_cast<LONG>(expected.size()); ++i) {
-        SCOPED_TRACE("element " + std::to_string(i));
-        _variant_t element;
-        ASSERT_EQ(S_OK, SafeArrayGetElement(value.parray, &i, &element));
-        const Element& want = expected[static_cast<std::size_t>(i)];
-        ASSERT_EQ(want.vt, element.vt);
-        if (want.vt == VT_I4) {
-            EXPECT_EQ(want.number, element.lVal);
-        } else if (want.vt == VT_R8) {
-            EXPECT_EQ(want.number, element.dblVal);
-        } else if (want.vt == VT_BSTR) {
-            EXPECT_EQ(want.text, std::u16string(BstrView(element.bstrVal)));
-        }
-    }
-}
-
-std::string Narrow(const std::u16string& text) { return Utf16ToUtf8(text); }
-
-IXMLDOMDocument2Ptr LoadDocument(const std::string& xml) {
-    IXMLDOMDocument2Ptr doc;
-    EXPECT_EQ(S_OK, doc.CreateInstance(kProgIdDOMDocument40));
-    doc->Putasync(VARIANT_FALSE);
-    doc->PutvalidateOnParse(VARIANT_FALSE);
-    EXPECT_EQ(VARIANT_TRUE, doc->loadXML(_bstr_t(xml))) << xml;
-    return doc;
-}
 
 KestCdfCalItemValue ReadValue(const std::string& xml) {
     IXMLDOMDocument2Ptr doc = LoadDocument(xml);
@@ -76,15 +35,6 @@ IXMLDOMNodePtr WriteValue(KestCdfCalItemValue& value, IXMLDOMDocument2Ptr& doc) 
 std::u16string WrittenText(KestCdfCalItemValue& value) {
     IXMLDOMDocument2Ptr doc;
     return WriteValue(value, doc)->Gettext().ToU16String();
-}
-
-int ReasonOf(const std::function<void()>& action) {
-    try {
-        action();
-    } catch (const KestCalmorphDLLError& error) {
-        return error.GetReason();
-    }
-    return -1;
 }
 
 KestCdfNormalizedString Text(const char16_t* text) {
