@@ -89,21 +89,9 @@ void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes
 
 KestCdfAxis::KestCdfAxis() = default;
 
-KestCdfAxis::KestCdfAxis(const KestCdfAxis& other)
-    : m_value(other.m_value),
-      m_size(other.m_size),
-      m_swUnits(other.m_swUnits),
-      m_formatType(other.m_formatType) {}
+KestCdfAxis::KestCdfAxis(const KestCdfAxis& other) = default;
 
-KestCdfAxis& KestCdfAxis::operator=(const KestCdfAxis& other) {
-    if (this != &other) {
-        m_value = other.m_value;
-        m_size = other.m_size;
-        m_swUnits = other.m_swUnits;
-        m_formatType = other.m_formatType;
-    }
-    return *this;
-}
+KestCdfAxis& KestCdfAxis::operator=(const KestCdfAxis& other) = default;
 
 KestCdfAxis::~KestCdfAxis() = default;
 

@@ -41,21 +41,9 @@ void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes
 
 KestCdfCalItemValue::KestCdfCalItemValue() = default;
 
-KestCdfCalItemValue::KestCdfCalItemValue(const KestCdfCalItemValue& other)
-    : m_value(other.m_value),
-      m_units(other.m_units),
-      m_formatType(other.m_formatType),
-      m_fromDocument(other.m_fromDocument) {}
+KestCdfCalItemValue::KestCdfCalItemValue(const KestCdfCalItemValue& other) = default;
 
-KestCdfCalItemValue& KestCdfCalItemValue::operator=(const KestCdfCalItemValue& other) {
-    if (this != &other) {
-        m_value = other.m_value;
-        m_units = other.m_units;
-        m_formatType = other.m_formatType;
-        m_fromDocument = other.m_fromDocument;
-    }
-    return *this;
-}
+KestCdfCalItemValue& KestCdfCalItemValue::operator=(const KestCdfCalItemValue& other) = default;
 
 KestCdfCalItemValue::~KestCdfCalItemValue() = default;
 

@@ -11,13 +11,24 @@ IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
     return element;
 }
 
-void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
-                       const _bstr_t& ns, BSTR text) {
+IXMLDOMNodePtr AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                                 const OLECHAR* name, const _bstr_t& ns, BSTR text) {
     IXMLDOMNodePtr element = AppendElement(parent, doc, name, ns);
     IXMLDOMNodePtr node =
         doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
     node->PutnodeValue(_variant_t(_bstr_t(BstrView(text))));
     element->appendChild(node);
+    return element;
+}
+
+bool AppendFileReference(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                         const _bstr_t& ns, BSTR fileName, const char* crcText) {
+    if (!doc) throw _com_error(E_POINTER);
+    IXMLDOMNodePtr element = AppendTextElement(parent, doc, name, ns, fileName);
+    IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
+    if (!attributes) return false;
+    AddAttribute(doc, attributes, u"crc32", CComBSTR(crcText));
+    return true;
 }
 
 CComBSTR TextOf(const IXMLDOMNodePtr& node) {

@@ -12,9 +12,15 @@ namespace detail {
 IXMLDOMNodePtr AppendElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
                              const OLECHAR* name, const _bstr_t& ns);
 
-/// Appends the element `name` holding one text node; a null text gives empty content.
-void AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
-                       const _bstr_t& ns, BSTR text);
+/// Appends the element `name` holding one text node and returns it; a null text gives empty
+/// content.
+IXMLDOMNodePtr AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                                 const OLECHAR* name, const _bstr_t& ns, BSTR text);
+
+/// Writes a SYMBOLIC-FILE or TARGET-IMAGE element: the file name as its text, then the crc32
+/// attribute. False when the new element offers no attribute map (the element stays).
+bool AppendFileReference(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
+                         const _bstr_t& ns, BSTR fileName, const char* crcText);
 
 /// A node's value as owned text; an element's (null) value throws _com_error.
 CComBSTR TextOf(const IXMLDOMNodePtr& node);

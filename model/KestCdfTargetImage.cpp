@@ -1,5 +1,7 @@
 #include "KestCdfTargetImage.h"
 
+#include "KestCdfDomWriting.h"
+
 #include "../core/KestCalmorphDLLError.h"
 #include "KestCdfSymbolicFile.h"
 
@@ -48,22 +50,10 @@ bool KestCdfTargetImage::ConvertTargetImageFileNodeToXML(IXMLDOMNodePtr parent,
                                                          IXMLDOMDocument* doc,
                                                          KestCdfNormalizedString ns) {
     char buffer[11] = "0x00000000";
-    if (!doc) throw _com_error(E_POINTER);
-    IXMLDOMNodePtr element =
-        doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)), _bstr_t(u"TARGET-IMAGE"),
-                        _bstr_t(ns.m_string.m_str, true));
-    parent->appendChild(element);
-    IXMLDOMNodePtr text =
-        doc->createNode(_variant_t(static_cast<int>(NODE_TEXT)), _bstr_t(u""), _bstr_t(u""));
-    text->PutnodeValue(_variant_t(_bstr_t(m_fileName.m_string.View())));
-    element->appendChild(text);
-    IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
-    if (!attributes) return false;
-    IXMLDOMAttributePtr crc = doc->createAttribute(_bstr_t(u"crc32"));
     hdtoa(static_cast<unsigned int>(m_crc), buffer);
-    crc->PutnodeValue(_variant_t(static_cast<const char*>(buffer)));
-    attributes->setNamedItem(crc);
-    return true;
+    return detail::AppendFileReference(parent, doc, u"TARGET-IMAGE",
+                                       _bstr_t(ns.m_string.m_str, true), m_fileName.m_string.m_str,
+                                       buffer);
 }
 
 }  // namespace kest
