@@ -46,7 +46,10 @@ KestCalmorph::KestCalmorph(const KestCalmorph& other)
     : m_calData(other.m_calData),
       m_writeDocument(other.m_writeDocument),
       m_currentNode(other.m_currentNode),
-      m_documentPointer(other.m_documentPointer) {}
+      m_documentPointer(other.m_documentPointer),
+      m_readOptions(other.m_readOptions),
+      m_lastLoadError(other.m_lastLoadError),
+      m_usedBuiltinSchema(other.m_usedBuiltinSchema) {}
 
 KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
     if (this != &other) {
@@ -54,6 +57,9 @@ KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
         m_writeDocument = other.m_writeDocument;
         m_currentNode = other.m_currentNode;
         m_documentPointer = other.m_documentPointer;
+        m_readOptions = other.m_readOptions;
+        m_lastLoadError = other.m_lastLoadError;
+        m_usedBuiltinSchema = other.m_usedBuiltinSchema;
     }
     return *this;
 }
