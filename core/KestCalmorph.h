@@ -84,6 +84,12 @@ class KestCalmorph {
     /// The directory part of `path`, up to and including its last '/' or '\\'; empty when it
     /// has neither.
     std::string GetFilePath(CComBSTR path);
+    /// Applies the read options to a document about to load a file.
+    void PrepareReadDocument(const IXMLDOMDocument2Ptr& document, bool validate) const;
+    /// Records the outcome of a load or validation as the last load error (and whether the
+    /// built-in schema served).
+    void RecordLoadResult(const IXMLDOMParseErrorPtr& result, const IXMLDOMDocument2Ptr& document,
+                          const CComBSTR& path);
 
     KestCdfCalData m_calData;
     IXMLDOMDocument* m_writeDocument = nullptr;

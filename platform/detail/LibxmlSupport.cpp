@@ -80,8 +80,8 @@ xmlParserInputPtr GuardedEntityLoader(const char* url, const char* id, xmlParser
         return nullptr;
     }
     if (policy->documentsLeft == 0) {
-        Refuse(*policy, "schema document " + location +
-                            " refused: the schema reads too many documents");
+        Refuse(*policy,
+               "schema document " + location + " refused: the schema reads too many documents");
         return nullptr;
     }
     --policy->documentsLeft;

@@ -160,10 +160,10 @@ ValidationOutcome ValidateDocument(std::string_view document, const std::vector<
         if (load.schema) {
             std::string target = SchemaTargetNamespace(*load.schema);
             if (target != resolved[0].namespaceURI) {
-                return Failure(resolved[0].location,
-                               "schema " + resolved[0].location + " has target namespace '" +
-                                   target + "', but the document names it for '" +
-                                   resolved[0].namespaceURI + "'");
+                return Failure(resolved[0].location, "schema " + resolved[0].location +
+                                                         " has target namespace '" + target +
+                                                         "', but the document names it for '" +
+                                                         resolved[0].namespaceURI + "'");
             }
         }
     } else {
