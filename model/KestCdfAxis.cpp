@@ -155,6 +155,14 @@ bool KestCdfAxis::ConvertAxisNode(IXMLDOMNodePtr node) {
     if (!node) throw _com_error(E_POINTER);
     SetAxisAttributes(node->Getattributes());
     IXMLDOMNodeListPtr children = node->GetchildNodes();
+    // What the writer writes for a STRING axis of no points or an empty LABEL is an element
+    // without children: read it as the setter's value for the empty text, so that it is
+    // written again.
+    if (!children->Getlength() && (detail::IsFormatType(m_formatType, detail::kFormatString) ||
+                                   detail::IsFormatType(m_formatType, detail::kFormatLabel))) {
+        SetAxisValue(_variant_t(u""));
+        return true;
+    }
     // Every child replaces the value, so the last one decides.
     for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
         // Numbers are parsed from the text as the DOM stores it: SetAxisValue's result for the
