@@ -6,8 +6,8 @@
 
 #include "../model/KestCdfCalData.h"
 #include "../platform/CComBSTR.h"
+#include "../platform/KestCalmorphDLLError.h"
 #include "../platform/XmlDom.h"
-#include "KestCalmorphDLLError.h"
 
 namespace kest {
 

@@ -7,7 +7,7 @@
 #include <string_view>
 #include <utility>
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 #include "KestCdfValueListCodec.h"
 
 namespace kest {

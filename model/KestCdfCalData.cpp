@@ -2,7 +2,7 @@
 
 #include "KestCdfDomWriting.h"
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 

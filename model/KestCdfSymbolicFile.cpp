@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <cstring>
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 namespace {
