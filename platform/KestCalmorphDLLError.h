@@ -43,6 +43,10 @@ constexpr int kSchemaNotLoaded = 44;          ///< data or schema file did not l
 constexpr int kSchemaLocationAbsent = 45;     ///< root has no xsi:schemaLocation
 }  // namespace reason
 
+/// A short English text for a reason code, for hosts and tools that show errors to people; an
+/// extension: the codes themselves carry no texts. "unknown reason" for a code never raised.
+const char* ReasonText(int reason) noexcept;
+
 /// A reason code and a reason text. Copies never share their text.
 class KestCalmorphDLLError {
   public:
