@@ -21,6 +21,8 @@ class IXMLDOMSchemaCollection : public RefCounted {
     /// Creates an empty collection for ProgID "Msxml2.XMLSchemaCache.4.0"; the caller owns the
     /// returned reference count of zero through ComPtr. Other names give REGDB_E_CLASSNOTREG.
     static HRESULT CreateInstance(const OLECHAR* progId, IXMLDOMSchemaCollection** result) noexcept;
+    /// True when the schema validator behind the collections and documents starts up.
+    static bool ValidatorUsable() noexcept;
 };
 
 }  // namespace kest
