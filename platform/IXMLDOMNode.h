@@ -18,12 +18,15 @@
 
 namespace kest {
 
+// Opaque handles of the DOM implementation; only their addresses appear here.
 namespace detail {
 struct DomDocument;
 struct DomNode;
-void DomAddRef(DomDocument* document) noexcept;
-void DomRelease(DomDocument* document) noexcept;
 }  // namespace detail
+
+/// Reference counting of a document, for the node pointers below.
+void DomAddRef(detail::DomDocument* document) noexcept;
+void DomRelease(detail::DomDocument* document) noexcept;
 
 enum DOMNodeType {
     NODE_INVALID = 0,
@@ -99,7 +102,7 @@ class DomPtr {
     bool operator==(std::nullptr_t) const noexcept { return m_handle.m_node == nullptr; }
     bool operator!=(std::nullptr_t) const noexcept { return m_handle.m_node != nullptr; }
     void Release() noexcept {
-        if (m_handle.m_doc) detail::DomRelease(m_handle.m_doc);
+        if (m_handle.m_doc) DomRelease(m_handle.m_doc);
         m_handle = I();
     }
     /// Documents only: creates a document by ProgID ("Msxml2.DOMDocument.4.0") or class id
@@ -111,7 +114,7 @@ class DomPtr {
         HRESULT hr = I::CreateDocument(progId, &document, &node);
         if (SUCCEEDED(hr)) {
             *this = DomPtr(document, node);
-            detail::DomRelease(document);  // CreateDocument returned one reference
+            DomRelease(document);  // CreateDocument returned one reference
         }
         return hr;
     }
@@ -119,7 +122,7 @@ class DomPtr {
     /// For the DOM implementation: a pointer to `node`, taking a new reference to `document`.
     DomPtr(detail::DomDocument* document, detail::DomNode* node) noexcept {
         if (document && node) {
-            detail::DomAddRef(document);
+            DomAddRef(document);
             m_handle.m_doc = document;
             m_handle.m_node = node;
         }
