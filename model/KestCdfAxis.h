@@ -5,12 +5,13 @@
 #include <string_view>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfAxis {
+class KEST_API KestCdfAxis {
   public:
     /// An empty axis: value VT_EMPTY, size 0, empty units and format type.
     KestCdfAxis();

@@ -5,12 +5,13 @@
 #include <string_view>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfCalItemValue {
+class KEST_API KestCdfCalItemValue {
   public:
     /// An empty value: VT_EMPTY, empty units and format type, not read from a document.
     KestCdfCalItemValue();

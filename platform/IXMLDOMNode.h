@@ -14,6 +14,7 @@
 
 #include "BstrT.h"
 #include "ComPtr.h"
+#include "Export.h"
 #include "VariantT.h"
 
 namespace kest {
@@ -25,8 +26,8 @@ struct DomNode;
 }  // namespace detail
 
 /// Reference counting of a document, for the node pointers below.
-void DomAddRef(detail::DomDocument* document) noexcept;
-void DomRelease(detail::DomDocument* document) noexcept;
+KEST_API void DomAddRef(detail::DomDocument* document) noexcept;
+KEST_API void DomRelease(detail::DomDocument* document) noexcept;
 
 enum DOMNodeType {
     NODE_INVALID = 0,
@@ -148,7 +149,7 @@ using IXMLDOMParseErrorPtr = ComPtr<IXMLDOMParseError>;
 using IXMLDOMSchemaCollectionPtr = ComPtr<IXMLDOMSchemaCollection>;
 
 /// Any node. Reached through a DomPtr.
-class IXMLDOMNode {
+class KEST_API IXMLDOMNode {
   public:
     /// The node's kind.
     DOMNodeType GetnodeType() const;
@@ -209,9 +210,9 @@ class IXMLDOMNode {
 };
 
 /// Kind checks used by the pointer conversions.
-bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept;
+KEST_API bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept;
 
-class IXMLDOMElement : public IXMLDOMNode {
+class KEST_API IXMLDOMElement : public IXMLDOMNode {
   public:
     /// The attribute with this qualified name, or an empty pointer.
     IXMLDOMAttributePtr getAttributeNode(const _bstr_t& name) const;
@@ -225,28 +226,28 @@ class IXMLDOMElement : public IXMLDOMNode {
     }
 };
 
-class IXMLDOMAttribute : public IXMLDOMNode {
+class KEST_API IXMLDOMAttribute : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_ATTRIBUTE);
     }
 };
 
-class IXMLDOMText : public IXMLDOMNode {
+class KEST_API IXMLDOMText : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_TEXT) || DomNodeIs(node, NODE_CDATA_SECTION);
     }
 };
 
-class IXMLDOMComment : public IXMLDOMNode {
+class KEST_API IXMLDOMComment : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_COMMENT);
     }
 };
 
-class IXMLDOMProcessingInstruction : public IXMLDOMNode {
+class KEST_API IXMLDOMProcessingInstruction : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_PROCESSING_INSTRUCTION);

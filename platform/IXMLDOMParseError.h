@@ -1,11 +1,12 @@
 #pragma once
 // IXMLDOMParseError: why a load or a validation failed. Code 0 and an empty reason mean success.
 
+#include "Export.h"
 #include "IXMLDOMNode.h"
 
 namespace kest {
 
-class IXMLDOMParseError : public RefCounted {
+class KEST_API IXMLDOMParseError : public RefCounted {
   public:
     /// 0 on success; otherwise a failure code (XML_E_PARSEFAILED, XML_E_INVALID,
     /// E_ACCESSDENIED...).

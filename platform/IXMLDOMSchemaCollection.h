@@ -2,11 +2,12 @@
 // IXMLDOMSchemaCollection: compiled XSD schemas by target namespace, attached to documents
 // for validate().
 
+#include "Export.h"
 #include "IXMLDOMNode.h"
 
 namespace kest {
 
-class IXMLDOMSchemaCollection : public RefCounted {
+class KEST_API IXMLDOMSchemaCollection : public RefCounted {
   public:
     /// Compiles the schema at `location` (a path or, when allowed, a URL) and registers it under
     /// `namespaceURI`. Throws _com_error when it cannot be read or compiled, or when its target

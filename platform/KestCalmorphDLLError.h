@@ -2,6 +2,7 @@
 // KestCalmorphDLLError: the one error type the library throws for failures it detects itself.
 
 #include "../platform/CComBSTR.h"
+#include "Export.h"
 
 namespace kest {
 
@@ -45,10 +46,10 @@ constexpr int kSchemaLocationAbsent = 45;     ///< root has no xsi:schemaLocatio
 
 /// A short English text for a reason code, for hosts and tools that show errors to people; an
 /// extension: the codes themselves carry no texts. "unknown reason" for a code never raised.
-const char* ReasonText(int reason) noexcept;
+KEST_API const char* ReasonText(int reason) noexcept;
 
 /// A reason code and a reason text. Copies never share their text.
-class KestCalmorphDLLError {
+class KEST_API KestCalmorphDLLError {
   public:
     /// Code 0 and an empty text.
     KestCalmorphDLLError() = default;
