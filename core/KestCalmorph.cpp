@@ -46,7 +46,8 @@ KestCalmorph::KestCalmorph(const KestCalmorph& other)
     : m_calData(other.m_calData),
       m_writeDocument(other.m_writeDocument),
       m_currentNode(other.m_currentNode),
-      m_documentPointer(other.m_documentPointer) {}
+      m_documentPointer(other.m_documentPointer),
+      m_writeOptions(other.m_writeOptions) {}
 
 KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
     if (this != &other) {
@@ -54,6 +55,7 @@ KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
         m_writeDocument = other.m_writeDocument;
         m_currentNode = other.m_currentNode;
         m_documentPointer = other.m_documentPointer;
+        m_writeOptions = other.m_writeOptions;
     }
     return *this;
 }
@@ -194,6 +196,7 @@ bool KestCalmorph::ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CCo
 
     WriteScope scope(m_writeDocument, m_currentNode);
     m_writeDocument = document.GetInterfacePtr();
+    if (m_writeOptions.indent) document->setProperty(_bstr_t(u"Indent"), _variant_t(true));
     CreateXMLEnvironment();
     // The whole tree is built before anything is saved: a writer that refuses the tree throws
     // here, and no file is touched.

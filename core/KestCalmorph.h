@@ -8,6 +8,7 @@
 #include "../platform/CComBSTR.h"
 #include "../platform/XmlDom.h"
 #include "KestCalmorphDLLError.h"
+#include "KestWriteOptions.h"
 
 namespace kest {
 
@@ -35,6 +36,10 @@ class KestCalmorph {
     bool ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment);
     /// A new default tree; the converter is not touched.
     KestCdfCalData ConvertCPPToXML();
+
+    /// Extension: the layout of the files ConvertCPPToXML writes (indentation, off by default).
+    void SetWriteOptions(const KestWriteOptions& options) { m_writeOptions = options; }
+    const KestWriteOptions& GetWriteOptions() const { return m_writeOptions; }
 
     /// A document a host parked on the converter (empty when none).
     IXMLDOMDocument2Ptr GetDocumentPointer();
@@ -78,6 +83,7 @@ class KestCalmorph {
     IXMLDOMDocument* m_writeDocument = nullptr;
     IXMLDOMNodePtr m_currentNode;
     IXMLDOMDocument2Ptr m_documentPointer;
+    KestWriteOptions m_writeOptions;
 };
 
 }  // namespace kest

@@ -27,6 +27,9 @@ class KestCdfAxis {
     /// any other format type leaves the stored value alone. A value without a text form (an
     /// array) throws _com_error and changes nothing.
     void SetAxisValue(_variant_t value);
+    /// Extension: stores a copy of `elements` (VT_ARRAY|VT_VARIANT, one dimension) as the
+    /// points as they stand, as SetValueElements does for item values.
+    void SetAxisElements(const _variant_t& elements);
 
     /// The number carried by the size attribute; never checked against the points.
     unsigned int GetSize() const noexcept { return m_size; }

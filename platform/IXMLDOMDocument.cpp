@@ -299,7 +299,7 @@ DOMNodeType NodeTypeOf(const _variant_t& type) {
 
 // Atomically replaces `path` with the document's text: a temporary file beside it is written
 // piece by piece and renamed over it; on any failure the temporary file is removed.
-void SaveAtomically(const DomNode* document, const std::string& path) {
+void SaveAtomically(const DomNode* document, const std::string& path, bool indent) {
     auto fail = [&](int err, const char* what) {
         throw _com_error(detail::HResultForErrno(err),
                          std::string(what) + " " + path + ": " + std::strerror(err));
@@ -360,7 +360,7 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
     };
     std::string buffer;
     buffer.reserve(1024 * 1024 + 64 * 1024);
-    long unrepresentable = detail::WriteXml(document, buffer, write);
+    long unrepresentable = detail::WriteXml(document, buffer, write, indent);
     if (unrepresentable >= 0) {
         // The file would not load again: refuse it rather than report a save that loses data.
         char code[32];
@@ -520,7 +520,7 @@ VARIANT_BOOL IXMLDOMDocument::loadBuffer(const void* data, std::size_t size) {
 void IXMLDOMDocument::save(const _variant_t& destination) {
     if (destination.vt != VT_BSTR)
         throw _com_error(E_INVALIDARG, "save takes a file path as a string");
-    SaveAtomically(&m_doc->node, Utf16ToUtf8(BstrView(destination.bstrVal)));
+    SaveAtomically(&m_doc->node, Utf16ToUtf8(BstrView(destination.bstrVal)), m_doc->indent);
 }
 
 IXMLDOMParseErrorPtr IXMLDOMDocument::GetparseError() const {
@@ -553,6 +553,8 @@ void IXMLDOMDocument2::setProperty(const _bstr_t& name, const _variant_t& value)
         long depth = static_cast<long>(value);
         if (depth < 0) throw _com_error(E_INVALIDARG, "MaxElementDepth cannot be negative");
         m_doc->maxElementDepth = depth;
+    } else if (name == u"Indent") {
+        m_doc->indent = static_cast<bool>(value);
     } else {
         throw _com_error(E_INVALIDARG, "unknown property " + Utf8(name));
     }
@@ -561,6 +563,7 @@ void IXMLDOMDocument2::setProperty(const _bstr_t& name, const _variant_t& value)
 _variant_t IXMLDOMDocument2::getProperty(const _bstr_t& name) const {
     if (name == u"ServerHTTPRequest") return _variant_t(m_doc->serverHttpRequest);
     if (name == u"MaxElementDepth") return _variant_t(m_doc->EffectiveMaxDepth());
+    if (name == u"Indent") return _variant_t(m_doc->indent);
     throw _com_error(E_INVALIDARG, "unknown property " + Utf8(name));
 }
 

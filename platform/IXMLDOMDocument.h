@@ -80,7 +80,9 @@ class IXMLDOMDocument : public IXMLDOMNode {
 class IXMLDOMDocument2 : public IXMLDOMDocument {
   public:
     /// Properties: "ServerHTTPRequest" (bool: allow http/https sources and schema locations),
-    /// "MaxElementDepth" (integer, 0 for the default). Other names: E_INVALIDARG.
+    /// "MaxElementDepth" (integer, 0 for the default), "Indent" (bool, off in a new document:
+    /// save puts each child of an element holding only elements on a line of its own, two
+    /// spaces per level; an extension of ours). Other names: E_INVALIDARG.
     void setProperty(const _bstr_t& name, const _variant_t& value);
     _variant_t getProperty(const _bstr_t& name) const;
     /// Attaches a schema collection used by validate(); an empty pointer detaches it.

@@ -168,6 +168,7 @@ struct DomDocument {
     bool preserveWhiteSpace = true;
     bool serverHttpRequest = false;
     long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
+    bool indent = false;       // save writes one element per line
     ComPtr<IXMLDOMSchemaCollection> schemas;
     DomError error;
     std::string url;  // where the current content was loaded from
