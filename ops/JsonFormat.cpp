@@ -415,13 +415,82 @@ Change ReadChange(const Json& value, const Path& path) {
     return change;
 }
 
-// Stops the parse at a nesting deeper than the format can hold.
-bool LimitDepth(int depth, Json::parse_event_t event, Json&) {
-    if ((event == Json::parse_event_t::object_start || event == Json::parse_event_t::array_start) &&
-        depth >= kJsonMaxDepth)
-        throw JsonImportError("", "nested deeper than " + std::to_string(kJsonMaxDepth) + " levels");
-    return true;
-}
+// Builds the JSON tree while it keeps the path of the value being parsed, so that a number out
+// of range or a nesting too deep is reported where it is.
+class PathTrackingParser {
+  public:
+    using number_integer_t = Json::number_integer_t;
+    using number_unsigned_t = Json::number_unsigned_t;
+    using number_float_t = Json::number_float_t;
+    using string_t = Json::string_t;
+    using binary_t = Json::binary_t;
+
+    explicit PathTrackingParser(Json& result) : m_dom(result, true) {}
+
+    bool null() { return Value(), m_dom.null(); }
+    bool boolean(bool value) { return Value(), m_dom.boolean(value); }
+    bool number_integer(number_integer_t value) { return Value(), m_dom.number_integer(value); }
+    bool number_unsigned(number_unsigned_t value) {
+        return Value(), m_dom.number_unsigned(value);
+    }
+    bool number_float(number_float_t value, const string_t& text) {
+        return Value(), m_dom.number_float(value, text);
+    }
+    bool string(string_t& value) { return Value(), m_dom.string(value); }
+    bool binary(binary_t& value) { return Value(), m_dom.binary(value); }
+    bool start_object(std::size_t size) { return Open(false), m_dom.start_object(size); }
+    bool key(string_t& key) {
+        m_frames.back().key = key;
+        return m_dom.key(key);
+    }
+    bool end_object() { return m_frames.pop_back(), m_dom.end_object(); }
+    bool start_array(std::size_t size) { return Open(true), m_dom.start_array(size); }
+    bool end_array() { return m_frames.pop_back(), m_dom.end_array(); }
+    bool parse_error(std::size_t, const std::string&, const nlohmann::detail::exception& error) {
+        // nlohmann's message names the byte; its type prefix ("[json.exception...] ") goes.
+        std::string reason = error.what();
+        const std::string::size_type end = reason.find("] ");
+        if (end != std::string::npos) reason.erase(0, end + 2);
+        throw JsonImportError(PathOf(true), "not JSON: " + reason);
+    }
+
+  private:
+    struct Frame {
+        bool array = false;
+        std::size_t count = 0;  // values started in this array
+        std::string key;        // the member being parsed in this object
+    };
+
+    void Value() {
+        if (!m_frames.empty()) ++m_frames.back().count;
+    }
+    void Open(bool array) {
+        Value();
+        if (m_frames.size() >= static_cast<std::size_t>(kJsonMaxDepth))
+            throw JsonImportError(PathOf(false), "nested deeper than " +
+                                                     std::to_string(kJsonMaxDepth) + " levels");
+        m_frames.push_back(Frame{array, 0, std::string()});
+    }
+    // The path of the last value started, or (`next`) of the one about to be.
+    std::string PathOf(bool next) const {
+        std::string path;
+        for (std::size_t i = 0; i < m_frames.size(); ++i) {
+            const Frame& frame = m_frames[i];
+            if (frame.array) {
+                std::size_t index = frame.count;
+                if (!(next && i + 1 == m_frames.size()) && index > 0) --index;
+                path += "[" + std::to_string(index) + "]";
+            } else if (!frame.key.empty() || i + 1 < m_frames.size()) {
+                if (!path.empty()) path += '.';
+                path += frame.key;
+            }
+        }
+        return path;
+    }
+
+    nlohmann::detail::json_sax_dom_parser<Json> m_dom;
+    std::vector<Frame> m_frames;
+};
 
 }  // namespace
 
@@ -503,15 +572,8 @@ std::string ExportJson(const Document& document) {
 
 Document ImportJson(std::string_view text) {
     Json root;
-    try {
-        root = Json::parse(text.begin(), text.end(), LimitDepth);
-    } catch (const Json::parse_error& error) {
-        // nlohmann's message names the byte; the type prefix ("[json.exception...]") goes.
-        std::string reason = error.what();
-        const std::string::size_type end = reason.find("] ");
-        if (end != std::string::npos) reason.erase(0, end + 2);
-        throw JsonImportError("", "not JSON: " + reason);
-    }
+    PathTrackingParser parser(root);
+    Json::sax_parse(text.begin(), text.end(), &parser);
     const Members m(root, Path(),
                     {"format", "version", "namespace", "schemaInstance", "schemaLocation",
                      "fileName", "company", "note", "changeHistory", "lists"});
