@@ -46,7 +46,7 @@ line two, with "quotes" &amp; a tab:	end \ backslash</NOTE>
     <CAL-ITEM>
       <NAME>Words</NAME>
       <AXIS size="2" sw-units="-" format-type="STRING">"low, cold" "high"</AXIS>
-      <VALUE sw-units-ref="-" format-type="STRING">"a,b" "say ""hi""" ""</VALUE>
+      <VALUE sw-units-ref="in &quot;q&quot;" format-type="STRING">"a,b" "c d"</VALUE>
       <NOTE>strings with commas &lt;and&gt; quotes</NOTE>
     </CAL-ITEM>
     <CAL-ITEM>
