@@ -21,6 +21,8 @@ class KestCdfAxis {
 
     /// A deep copy of the stored points (VT_EMPTY, or VT_ARRAY|VT_VARIANT).
     _variant_t GetAxisValue() const;
+    /// Extension: the stored points themselves, without a copy; valid until they change.
+    const _variant_t& PeekAxisValue() const noexcept { return m_value; }
     /// Stores new points read from `value` according to the format type, which must be set
     /// first. "NUMERIC" splits the text at spaces into VT_I4 or (when the text holds a '.')
     /// VT_R8 points, "STRING" takes the quoted strings, "LABEL" keeps the value as one point;

@@ -36,6 +36,9 @@ class KestCdfCalItem {
 
     /// Copy of the value object; throws _com_error(E_POINTER) when the item has none.
     KestCdfCalItemValue GetCalItemValue() const;
+    /// Extension: the value object itself, without a copy (null when the item has none); valid
+    /// while the tree holds it.
+    const KestCdfCalItemValue* PeekCalItemValue() const noexcept { return m_value.get(); }
     /// Refers to `value` without copying; an object the host allocated stays the host's and
     /// must outlive every copy of the tree.
     void SetCalItemValue(KestCdfCalItemValue* value) { m_value.Set(value); }

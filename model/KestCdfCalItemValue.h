@@ -21,6 +21,8 @@ class KestCdfCalItemValue {
 
     /// A deep copy of the stored value (VT_EMPTY, or VT_ARRAY|VT_VARIANT).
     _variant_t GetValue() const;
+    /// Extension: the stored value itself, without a copy; valid until the value changes.
+    const _variant_t& PeekValue() const noexcept { return m_value; }
     /// Stores a new value list according to the format type, which must be set first, and to
     /// whether the object was read from a document: read "NUMERIC" text is split into numbers,
     /// read quoted "STRING" text into strings; otherwise the value is kept as one element. A

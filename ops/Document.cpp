@@ -128,13 +128,11 @@ Item FromCalItem(const KestCdfCalItem& source) {
     item.name = Nullable(source.GetName());
     item.annotation = Nullable(source.GetAnnotation());
     item.note = Nullable(source.GetNote());
-    try {
-        const KestCdfCalItemValue value = source.GetCalItemValue();
-        item.units = Text(value.GetUnits());
-        item.format = Text(value.GetFormatType());
-        item.values = FromStored(value.GetValue());
-    } catch (const _com_error& error) {
-        if (error.Error() != E_POINTER) throw;  // no value object
+    // The values are read in place: a copy of each array would cost as much as the rest.
+    if (const KestCdfCalItemValue* value = source.PeekCalItemValue()) {
+        item.units = Text(value->GetUnits());
+        item.format = Text(value->GetFormatType());
+        item.values = FromStored(value->PeekValue());
     }
     const KestCdfAxis* axes = source.GetAxis();
     const int axisCount = Count(axes, source.GetAxisSize());
@@ -144,7 +142,7 @@ Item FromCalItem(const KestCdfCalItem& source) {
         axis.size = static_cast<std::int32_t>(axes[i].GetSize());
         axis.units = Text(axes[i].GetSwUnits());
         axis.format = Text(axes[i].GetFormatType());
-        axis.points = FromStored(axes[i].GetAxisValue());
+        axis.points = FromStored(axes[i].PeekAxisValue());
         item.axes.push_back(std::move(axis));
     }
     return item;

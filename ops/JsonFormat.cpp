@@ -1,5 +1,7 @@
 #include "JsonFormat.h"
 
+#include <algorithm>
+#include <charconv>
 #include <cmath>
 #include <cstdio>
 #include <limits>
@@ -83,12 +85,27 @@ class Writer {
             String(FormatNumber(value));
             return;
         }
-        std::string text = FormatNumber(value);
+        char buffer[40];
+        char* end = std::to_chars(buffer, buffer + sizeof buffer - 2, value).ptr;
         // A double keeps a fraction or an exponent, so readers that look at the number alone
         // still see a double.
-        if (text.find_first_of(".e") == std::string::npos) text += ".0";
-        out += text;
+        if (std::find_if(buffer, end, [](char c) { return c == '.' || c == 'e'; }) == end) {
+            *end++ = '.';
+            *end++ = '0';
+        }
+        out.append(buffer, end);
     }
+    void Integer(long long value) {
+        char buffer[24];
+        out.append(buffer, std::to_chars(buffer, buffer + sizeof buffer, value).ptr);
+    }
+    /// Hands what is written so far to the sink once it holds a megabyte or so.
+    void Flush(bool always = false) {
+        if (!sink || (!always && out.size() < (1u << 20))) return;
+        (*sink)(out);
+        out.clear();
+    }
+    const JsonSink* sink = nullptr;
 };
 
 char TypeLetter(Value::Kind kind) {
@@ -127,7 +144,7 @@ void WriteValueList(Writer& w, int depth, const ValueList& list) {
         first = false;
         switch (v.GetKind()) {
             case Value::Kind::kInteger:
-                w.out += std::to_string(v.Integer());
+                w.Integer(v.Integer());
                 break;
             case Value::Kind::kDouble:
                 w.Number(v.Number());
@@ -178,7 +195,7 @@ void WriteItem(Writer& w, int depth, const Item& item) {
         w.Line(depth + 2);
         w.out += '{';
         w.Key(depth + 3, "size", true);
-        w.out += std::to_string(axis.size);
+        w.Integer(axis.size);
         w.Key(depth + 3, "units");
         w.String(axis.units);
         w.Key(depth + 3, "format");
@@ -495,8 +512,16 @@ class PathTrackingParser {
 }  // namespace
 
 std::string ExportJson(const Document& document) {
+    std::string text;
+    text.reserve(256 + document.ItemCount() * 256);
+    ExportJson(document, [&](std::string_view piece) { text += piece; });
+    return text;
+}
+
+void ExportJson(const Document& document, const JsonSink& sink) {
     Writer w;
-    w.out.reserve(256 + document.ItemCount() * 256);
+    w.sink = &sink;
+    w.out.reserve((1u << 20) + 64 * 1024);
     w.out += '{';
     w.Key(1, "format", true);
     w.String(kJsonFormatName);
@@ -557,6 +582,7 @@ std::string ExportJson(const Document& document) {
             if (j) w.out += ',';
             w.Line(4);
             WriteItem(w, 4, list.items[j]);
+            w.Flush();
         }
         if (!list.items.empty()) w.Line(3);
         w.out += ']';
@@ -567,7 +593,7 @@ std::string ExportJson(const Document& document) {
     w.out += ']';
     w.Line(0);
     w.out += "}\n";
-    return std::move(w.out);
+    w.Flush(true);
 }
 
 Document ImportJson(std::string_view text) {

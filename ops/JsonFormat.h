@@ -2,6 +2,7 @@
 // The JSON form of a calibration document (docs/json-format.md, docs/cdf-json.schema.json):
 // lossless both ways, so that import of an export gives back the document it came from.
 
+#include <functional>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -32,8 +33,13 @@ class JsonImportError : public std::runtime_error {
     std::string m_reason;
 };
 
+/// Receives written text in pieces (each valid for the call only); may throw to stop.
+using JsonSink = std::function<void(std::string_view)>;
+
 /// The document as JSON text, two-space indented, ending in a line break.
 std::string ExportJson(const Document& document);
+/// The same text, handed to `sink` in pieces of about a megabyte as it is written.
+void ExportJson(const Document& document, const JsonSink& sink);
 
 /// The document a JSON text holds. Throws JsonImportError for text that is not JSON, nested
 /// deeper than kJsonMaxDepth, or not a document of this format: a member missing, unknown or
