@@ -18,15 +18,21 @@ struct ConvertOptions {
     std::string in;
     std::string out;
     std::string comment;
+    ReadSettings read;
 };
 
 // Reads the written file back as `calmorph info` would; returns why it would not read, or "".
-std::string WhyItWouldNotReadBack(const std::string& path) {
+std::string WhyItWouldNotReadBack(const std::string& path, const ReadSettings& settings) {
+    KestCalmorph reader;
+    KestReadOptions options = ReadOptionsOf(ReadSettings());
+    options.allowNetwork = !settings.offline;
+    reader.SetReadOptions(options);
     try {
-        KestCalmorph reader;
         CComBSTR message;
-        KestCdfCalData data = reader.ConvertXMLtoCPP(CComBSTR(path), true, message);
-        return message.ToString();
+        reader.ConvertXMLtoCPP(CComBSTR(path), true, message);
+        const KestLoadError& error = reader.GetLastLoadError();
+        if (error.code == 0) return message.ToString();
+        return (error.line > 0 ? "line " + std::to_string(error.line) + ": " : "") + error.reason;
     } catch (const KestCalmorphDLLError& error) {
         return "reason code " + std::to_string(error.GetReason()) + " (" +
                ReasonMeaning(error.GetReason()) + ")";
@@ -42,7 +48,7 @@ int RunConvert(const ConvertOptions& options) {
     KestCalmorph converter;
     KestCdfCalData data;
     int code = GuardedRun({options.in}, [&] {
-        ReadCdf(converter, options.in, data);
+        ReadCdf(converter, options.in, options.read, data);
         return kExitOk;
     });
     if (code != kExitOk) return code;
@@ -54,8 +60,11 @@ int RunConvert(const ConvertOptions& options) {
         if (!converter.ConvertCPPToXML(data, CComBSTR(output.Path()), CComBSTR(options.comment))) {
             throw ToolError(kExitCannotWrite, shown, "nothing was written");
         }
-        std::string why = WhyItWouldNotReadBack(output.Path());
-        if (!why.empty()) ReportWarning(shown, "the output would not read back: " + why);
+        std::string why = WhyItWouldNotReadBack(output.Path(), options.read);
+        if (!why.empty()) {
+            ReportWarning(shown, "the output would not read back: " + why);
+            if (options.read.strict) return kExitConversion;  // nothing is published
+        }
         output.Publish();
         return kExitOk;
     });
@@ -73,13 +82,15 @@ Command AddConvertCommand(CLI::App& calmorph) {
     app->add_option("OUT", options->out, "the file to write; - writes standard output")->required();
     app->add_option("--comment", options->comment, "a comment written at the start of CAL-DATA")
         ->type_name("TEXT");
+    AddReadOptions(*app, options->read);
     app->footer(
         "Exit codes:\n"
         "  0  OUT was written\n"
         "  1  usage error\n"
         "  2  IN cannot be loaded: missing, unreadable, not well-formed, not valid against the\n"
         "     schema it names, or no CAL-DATA element\n"
-        "  4  conversion error: the converter refused the content\n"
+        "  4  conversion error: the converter refused the content; with --strict, a warning\n"
+        "     (OUT is then not written)\n"
         "  5  OUT cannot be written (an existing OUT stays as it was)");
     return {app, [options] { return RunConvert(*options); }};
 }

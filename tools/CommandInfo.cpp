@@ -15,13 +15,14 @@ namespace {
 struct InfoOptions {
     std::string file;
     bool items = false;
+    ReadSettings read;
 };
 
 int RunInfo(const InfoOptions& options) {
     KestCalmorph converter;
     KestCdfCalData data;
     int code = GuardedRun({options.file}, [&] {
-        ReadCdf(converter, options.file, data);
+        ReadCdf(converter, options.file, options.read, data);
         return kExitOk;
     });
     if (code != kExitOk) return code;
@@ -39,13 +40,14 @@ Command AddInfoCommand(CLI::App& calmorph) {
         ->required();
     app->add_flag("--items", options->items,
                   "also print every item: name, units, format type, number of values, axis sizes");
+    AddReadOptions(*app, options->read);
     app->footer(
         "Exit codes:\n"
         "  0  the file was read and printed\n"
         "  1  usage error\n"
         "  2  FILE cannot be loaded: missing, unreadable, not well-formed, not valid against the\n"
         "     schema it names, or no CAL-DATA element\n"
-        "  4  conversion error: the converter refused the content");
+        "  4  conversion error: the converter refused the content; with --strict, a warning");
     return {app, [options] { return RunInfo(*options); }};
 }
 

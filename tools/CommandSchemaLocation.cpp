@@ -17,10 +17,14 @@ namespace {
 int RunSchemaLocation(const std::string& file) {
     return GuardedRun({file}, [&] {
         KestCalmorph converter;
+        // A file whose schema is missing still tells where it looks for it.
+        KestReadOptions options;
+        options.builtinSchemaFallback = true;
+        converter.SetReadOptions(options);
         CComBSTR message;
         CComBSTR location;
         try {
-            location = converter.DetectSchemaLocation(CComBSTR(InputPath(file)), message);
+            location = converter.DetectSchemaLocation(CComBSTR(file), message);
         } catch (const KestCalmorphDLLError& error) {
             if (error.GetReason() == reason::kSchemaLocationAbsent) {
                 throw ToolError(kExitNoSchema, DisplayName(file),
@@ -30,7 +34,9 @@ int RunSchemaLocation(const std::string& file) {
                             "cannot load (reason code " + std::to_string(error.GetReason()) + ": " +
                                 ReasonMeaning(error.GetReason()) + ")");
         }
-        if (message.Length() != 0) ThrowLoadFailure(file, message.ToString(), true);
+        if (converter.GetLastLoadError().code != 0) {
+            ThrowLoadFailure(file, converter.GetLastLoadError());
+        }
         std::printf("%s\n", location.ToString().c_str());
         return kExitOk;
     });

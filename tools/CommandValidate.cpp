@@ -1,7 +1,5 @@
 // calmorph validate: checks files against the schema they name or a given one.
 
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <cstdio>
 #include <memory>
@@ -23,22 +21,16 @@ struct ValidateOptions {
     std::string schema;
 };
 
-bool IsRegularReadableFile(const std::string& path) {
-    std::FILE* file = std::fopen(path.c_str(), "rb");
-    if (!file) return false;
-    struct stat info {};
-    bool regular = fstat(fileno(file), &info) == 0 && !S_ISDIR(info.st_mode);
-    std::fclose(file);
-    return regular;
-}
-
-std::string DirectoryOf(const std::string& path) {
-    std::string::size_type separator = path.find_last_of('/');
-    return separator == std::string::npos ? std::string() : path.substr(0, separator + 1);
-}
-
 // The schema location the root names: the text after the first blank of xsi:schemaLocation,
 // or xsi:noNamespaceSchemaLocation.
+constexpr const char* kSchemaHint = "use --schema XSD";
+
+ExitCode Verdict(long code) { return code == XML_E_INVALID ? kExitInvalid : kExitCannotLoad; }
+
+std::string Lead(ExitCode verdict, const std::string& schema) {
+    return verdict == kExitInvalid ? "not valid against " + schema + ": " : std::string();
+}
+
 std::string NamedLocation(const std::string& file, const IXMLDOMElementPtr& root) {
     if (IXMLDOMAttributePtr attribute = root->getAttributeNode(_bstr_t(u"xsi:schemaLocation"))) {
         std::string value = _bstr_t(attribute->GetnodeValue()).ToString();
@@ -61,64 +53,38 @@ int ValidateAgainstNamedSchema(const std::string& file) {
     document->Putasync(VARIANT_FALSE);
     document->PutvalidateOnParse(VARIANT_FALSE);
     document->setProperty(_bstr_t(u"ServerHTTPRequest"), _variant_t(true));
-    if (document->load(_variant_t(InputPath(file))) == VARIANT_FALSE) {
-        ThrowLoadFailure(file, document->GetparseError()->Getreason().ToString(), false);
+    if (document->load(_variant_t(file)) == VARIANT_FALSE) {
+        ThrowLoadFailure(file, document->GetparseError(), kExitCannotLoad, "", kSchemaHint);
     }
     std::string location = NamedLocation(file, document->GetdocumentElement());
-
-    // A single local location is looked up where the validator will look: beside the file.
-    bool local = location.compare(0, 4, "http") != 0 && location.find(' ') == std::string::npos;
-    if (local && file != "-") {
-        std::string resolved = location;
-        if (!location.empty() && location[0] != '/') resolved = DirectoryOf(file) + location;
-        if (!IsRegularReadableFile(resolved)) {
-            throw ToolError(kExitCannotLoad, DisplayName(file),
-                            "the schema it names cannot be read: " + resolved, "use --schema XSD");
-        }
-    }
-
     IXMLDOMParseErrorPtr result = document->validate();
-    if (result->GeterrorCode() == 0) {
-        std::printf("%s: valid against %s\n", DisplayName(file).c_str(), location.c_str());
-        return kExitOk;
+    if (result->GeterrorCode() != 0) {
+        // Only a verdict on the document is "not valid"; a schema that does not load or a
+        // document the validator cannot parse is a load failure.
+        const ExitCode code = Verdict(result->GeterrorCode());
+        ThrowLoadFailure(file, result, code, Lead(code, location), kSchemaHint);
     }
-    // Only a verdict on the document is "not valid"; a schema that does not load or a document
-    // the validator cannot parse is a load failure.
-    const bool invalid = result->GeterrorCode() == XML_E_INVALID;
-    throw ToolError(invalid ? kExitInvalid : kExitCannotLoad,
-                    Where(DisplayName(file), result->Getline(), result->Getlinepos()),
-                    (invalid ? "not valid against " + location + ": " : std::string()) +
-                        result->Getreason().ToString());
+    std::printf("%s: valid against %s\n", DisplayName(file).c_str(), location.c_str());
+    return kExitOk;
 }
 
 int ValidateAgainstSchemaFile(KestCalmorph& converter, const std::string& file,
                               const std::string& schema) {
-    CComBSTR message;
     try {
-        message =
-            converter.ValidateXMLFileWithLocaleXSD(CComBSTR(InputPath(file)), CComBSTR(schema));
+        converter.ValidateXMLFileWithLocaleXSD(CComBSTR(file), CComBSTR(schema));
     } catch (const KestCalmorphDLLError& error) {
         if (error.GetReason() != reason::kSchemaNotLoaded) throw;
-        throw ToolError(kExitCannotLoad, schema, "the schema file cannot be loaded");
+        ThrowLoadFailure(schema, converter.GetLastLoadError(), kExitCannotLoad,
+                         "the schema file cannot be loaded: ");
     } catch (const _com_error& error) {
-        throw ToolError(kExitCannotLoad, schema, "the schema is refused: " + error.Description());
+        throw ToolError(kExitCannotLoad, schema, error.Description());
     }
-    if (message.Length() == 0) {
-        std::printf("%s: valid against %s\n", DisplayName(file).c_str(), schema.c_str());
-        return kExitOk;
+    const KestLoadError& error = converter.GetLastLoadError();
+    if (error.code != 0) {
+        ThrowLoadFailure(file, error, Verdict(error.code), Lead(Verdict(error.code), schema));
     }
-
-    // The message alone does not tell a file that does not load from one that is invalid.
-    IXMLDOMDocument2Ptr document;
-    if (file != "-" && SUCCEEDED(document.CreateInstance(kProgIdDOMDocument40))) {
-        document->Putasync(VARIANT_FALSE);
-        document->PutvalidateOnParse(VARIANT_FALSE);
-        if (document->load(_variant_t(file)) == VARIANT_FALSE) {
-            ThrowLoadFailure(file, message.ToString(), false);
-        }
-    }
-    throw ToolError(kExitInvalid, DisplayName(file),
-                    "not valid against " + schema + ": " + message.ToString());
+    std::printf("%s: valid against %s\n", DisplayName(file).c_str(), schema.c_str());
+    return kExitOk;
 }
 
 int RunValidate(const ValidateOptions& options) {

@@ -42,8 +42,14 @@ TEST(CalmorphCommandLine, CommandsAnswerAsTheirHelpSays) {
     dir.Write("badschema.cdf", Root(kCdfNs, "xsi:schemaLocation", "notaschema.xsd"));
     // Read without validation (the schema attribute is misspelled), written with a proper one.
     dir.Write("misspelled.cdf", Root("urn:other", "xsi:schemaLocaton", "nowhere.xsd"));
-    const std::vector<std::string> inputs = {"badschema.cdf", "cdf.xsd", "misspelled.cdf",
-                                             "notaschema.xsd", "sample.cdf"};
+    dir.Write("elsewhere.cdf", Root(kCdfNs, "xsi:schemaLocation", "nowhere.xsd"));
+    dir.Write("remote.cdf", Root(kCdfNs, "xsi:schemaLocation", "http://127.0.0.1:9/cdf.xsd"));
+    dir.Write("foreign.cdf", Root("urn:other", "xsi:schemaLocation", "nowhere.xsd"));
+    dir.Write("invalid.cdf", Root(kCdfNs, "xsi:schemaLocation", "cdf.xsd", "<CHANGE-HISTORY/>"));
+    const std::vector<std::string> inputs = {"badschema.cdf",  "cdf.xsd",     "misspelled.cdf",
+                                             "notaschema.xsd", "sample.cdf",  "elsewhere.cdf",
+                                             "remote.cdf",     "foreign.cdf", "invalid.cdf"};
+    const std::string fallback = "note: the schema it names (nowhere.xsd) is not at hand; ";
     const Row rows[] = {
         {"--version", 0, {"calmorph " KEST_PROJECT_VERSION "\n"}, {}, {}},
         {"info --help", 0, {"Usage: calmorph info", "--items", "Exit codes:\n  0  "}, {}, {}},
@@ -66,6 +72,22 @@ TEST(CalmorphCommandLine, CommandsAnswerAsTheirHelpSays) {
          {"out.cdf: warning: the output would not read back: ", "nowhere.xsd"},
          {"out.cdf"}},
         {"validate badschema.cdf", 2, {}, {"badschema.cdf: error: ", "notaschema.xsd"}, {}},
+        {"info --items - <sample.cdf", 0, {"file: -\n", "item TorqueLimit"}, {}, {}},
+        {"validate - <invalid.cdf", 3, {}, {"<stdin>:1:", "error: not valid against cdf.xsd"}, {}},
+        {"info elsewhere.cdf",
+         0,
+         {"schema location: " + kCdfNs},
+         {"elsewhere.cdf: " + fallback},
+         {}},
+        {"info --offline remote.cdf", 0, {"file: remote.cdf"}, {"remote.cdf: note: "}, {}},
+        {"info --schema cdf.xsd elsewhere.cdf", 0, {"file: elsewhere.cdf"}, {}, {}},
+        {"info foreign.cdf",
+         2,
+         {},
+         {"foreign.cdf: error: ", "hint: use --schema or --no-validate\n"},
+         {}},
+        {"info --no-validate foreign.cdf", 0, {"namespace: urn:other"}, {}, {}},
+        {"convert --strict misspelled.cdf out.cdf", 4, {}, {"out.cdf: warning: "}, {}},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.command);

@@ -171,7 +171,7 @@ TEST(Calmorph, FailuresExitWithTheirCodeAndNameTheFile) {
          "elsewhere.cdf: valid against cdf.xsd\n"},
         {{"validate", "--schema", "cdf.xsd", "invalid.cdf"},
          3,
-         {"invalid.cdf: error: not valid against cdf.xsd", "FILENAME"},
+         {"invalid.cdf:2: error: not valid against cdf.xsd", "FILENAME"},
          nullptr},
         {{"validate", "--schema", "none.xsd", "sample.cdf"},
          2,
