@@ -1,5 +1,6 @@
 #include "StagedOutput.h"
 
+#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -58,26 +59,50 @@ void SyncDirectoryOf(const std::string& path) {
     ::close(fd);
 }
 
+std::string StagingPrefix(const std::string& base) { return "." + base.substr(0, 200) + "."; }
+constexpr const char* kStagingSuffix = ".tmp-staged";
+
+// Removes files staged for `base` in `dir` by calmorph processes that have ended.
+void RemoveStaleStaging(const std::string& dir, const std::string& base) {
+    DIR* listing = ::opendir(dir.empty() ? "." : dir.c_str());
+    if (!listing) return;
+    const std::string prefix = StagingPrefix(base);
+    while (dirent* entry = ::readdir(listing)) {
+        const std::string name = entry->d_name;
+        if (name.compare(0, prefix.size(), prefix) != 0) continue;
+        char* end = nullptr;
+        const long pid = std::strtol(name.c_str() + prefix.size(), &end, 10);
+        if (pid <= 0 || std::strcmp(end, kStagingSuffix) != 0 || pid == ::getpid()) continue;
+        if (::kill(static_cast<pid_t>(pid), 0) == 0 || errno != ESRCH) continue;
+        ::unlink((dir + name).c_str());
+    }
+    ::closedir(listing);
+}
+
 }  // namespace
 
 StagedOutput::StagedOutput(std::string target) : m_target(std::move(target)) {
-    if (m_target == "-" && ::access(".", W_OK) == 0) {
-        // A later read of what was piped out resolves a relative schema location against the
-        // current folder, as the check of the staged copy then does.
-        m_staged = ".calmorph-" + std::to_string(::getpid()) + ".cdf";
-    } else if (m_target == "-") {
+    std::string dir;
+    std::string base = "calmorph-stdout";
+    if (m_target != "-") {
+        std::string file = Resolved(m_target);
+        std::string::size_type slash = file.rfind('/');
+        dir = slash == std::string::npos ? "" : file.substr(0, slash + 1);
+        base = slash == std::string::npos ? file : file.substr(slash + 1);
+    }
+    if (m_target == "-" && ::access(".", W_OK) != 0) {
         const char* tmp = std::getenv("TMPDIR");
         std::string folder = std::string(tmp && *tmp ? tmp : "/tmp") + "/calmorph.XXXXXX";
         if (!::mkdtemp(&folder[0])) Fail(m_target, "cannot stage", errno);
         m_folder = folder;
         m_staged = folder + "/out.cdf";
     } else {
-        std::string file = Resolved(m_target);
-        std::string::size_type slash = file.rfind('/');
-        std::string dir = slash == std::string::npos ? "" : file.substr(0, slash + 1);
-        std::string base = slash == std::string::npos ? file : file.substr(slash + 1);
-        // Hidden, and named after this process, so that a leftover tells whose it was.
-        m_staged = dir + "." + base.substr(0, 180) + ".calmorph-" + std::to_string(::getpid());
+        // Standard output is staged in the current folder: a later read of what was piped out
+        // resolves a relative schema location against it, as the check of the staged copy does.
+        // The name follows the library's temporaries, so that saves of the target remove it
+        // once this process has ended, as the next convert does.
+        RemoveStaleStaging(dir, base);
+        m_staged = dir + StagingPrefix(base) + std::to_string(::getpid()) + kStagingSuffix;
     }
     Remember(g_stagedFile, m_staged);
     Remember(g_stagedFolder, m_folder);
