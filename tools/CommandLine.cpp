@@ -14,10 +14,10 @@ namespace {
 
 constexpr const char* kOverview =
     "Commands (calmorph COMMAND --help shows a command's options and exit codes):\n"
-    "  calmorph info FILE [--items]\n"
+    "  calmorph info FILE [--items] [READ OPTIONS]\n"
     "      Print the header, change history and calibration lists of FILE; with --items\n"
     "      also every item (name, units, format type, number of values, axis sizes).\n"
-    "  calmorph convert IN OUT [--comment TEXT]\n"
+    "  calmorph convert IN OUT [--comment TEXT] [READ OPTIONS]\n"
     "      Read IN and write it to OUT as a UTF-8 CDF file, with TEXT as a comment at the\n"
     "      start of CAL-DATA. OUT is replaced only when the whole file could be written.\n"
     "  calmorph validate FILE... [--schema XSD]\n"
@@ -26,6 +26,11 @@ constexpr const char* kOverview =
     "  calmorph schema-location FILE\n"
     "      Print the schema location FILE names (the text after the first blank of its\n"
     "      xsi:schemaLocation).\n"
+    "READ OPTIONS: --schema XSD (validate against XSD instead of the schema the file names),\n"
+    "  --no-validate, --offline (fetch nothing over the network: a CDF file naming an http\n"
+    "  schema is validated against the built-in cdf.xsd, as one naming a missing local schema\n"
+    "  always is),\n"
+    "  --strict (every warning is an error, exit 4).\n"
     "A FILE or IN of - is standard input; an OUT of - is standard output.\n"
     "\n"
     "Exit codes:\n"
@@ -35,7 +40,8 @@ constexpr const char* kOverview =
     "     the schema it names, or no CAL-DATA element; for validate also a schema that cannot\n"
     "     be loaded or a document the validator cannot parse\n"
     "  3  validate: a file is not valid against its schema\n"
-    "  4  conversion error: the converter refused the content (reason code and item name)\n"
+    "  4  conversion error: the converter refused the content (reason code and item name);\n"
+    "     with --strict also any warning\n"
     "  5  the output file cannot be written\n"
     "  6  the file names no schema (no xsi:schemaLocation on its root)\n"
     "With several files, validate exits with the highest code of any file.\n"
@@ -58,6 +64,11 @@ int RunCommandLine(int argc, char** argv) {
         commands.push_back(add(calmorph));
         // The overview above lists the commands with their arguments.
         commands.back().app->group("");
+        // Positional arguments are named for what they are (FILE, IN); a type adds nothing.
+        for (CLI::Option* argument : commands.back().app->get_options(
+                 [](CLI::Option* option) { return option->get_positional(); })) {
+            argument->type_name("");
+        }
     }
 
     try {
