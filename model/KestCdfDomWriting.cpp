@@ -1,5 +1,7 @@
 #include "KestCdfDomWriting.h"
 
+#include "KestCdfValueListCodec.h"
+
 namespace kest {
 namespace detail {
 
@@ -46,9 +48,10 @@ CComBSTR ElementText(const IXMLDOMNodePtr& element) {
 }
 
 void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const OLECHAR* name, BSTR value) {
-    IXMLDOMAttributePtr attribute = doc->createAttribute(_bstr_t(name));
-    attribute->PutnodeValue(_variant_t(_bstr_t(BstrView(value))));
+                  const _bstr_t& name, BSTR value) {
+    IXMLDOMAttributePtr attribute = doc->createAttribute(name);
+    const LentText text(value);
+    attribute->PutnodeValue(text.Get());
     attributes->setNamedItem(attribute);
 }
 
