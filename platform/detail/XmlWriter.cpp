@@ -2,6 +2,8 @@
 
 #include <vector>
 
+#include "DomNames.h"
+
 namespace kest {
 namespace detail {
 
@@ -114,12 +116,6 @@ void AppendComment(std::string& out, std::string_view text) {
     out += "-->";
 }
 
-bool IsUtf8Name(std::string_view encoding) {
-    std::string lower;
-    for (char c : encoding) lower += static_cast<char>(c >= 'A' && c <= 'Z' ? c + 32 : c);
-    return lower == "utf-8" || lower == "utf8";
-}
-
 void AppendPI(std::string& out, const DomNode* node) {
     out += "<?";
     out += node->Name();
@@ -128,7 +124,7 @@ void AppendPI(std::string& out, const DomNode* node) {
         AppendAttribute(out, "version", version ? version->Text() : "1.0");
         for (const DomNode* a = node->FirstAttribute(); a; a = a->next) {
             if (a == version) continue;
-            if (a->Name() == "encoding" && !IsUtf8Name(a->Text()))
+            if (a->Name() == "encoding" && !IsUtf8EncodingName(a->Text()))
                 AppendAttribute(out, "encoding", "UTF-8");
             else
                 AppendAttribute(out, a->Name(), a->Text());
