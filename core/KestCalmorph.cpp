@@ -42,27 +42,6 @@ class WriteScope {
 
 KestCalmorph::KestCalmorph() = default;
 
-KestCalmorph::KestCalmorph(const KestCalmorph& other)
-    : m_calData(other.m_calData),
-      m_writeDocument(other.m_writeDocument),
-      m_currentNode(other.m_currentNode),
-      m_documentPointer(other.m_documentPointer) {}
-
-KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
-    if (this != &other) {
-        m_calData = other.m_calData;
-        m_writeDocument = other.m_writeDocument;
-        m_currentNode = other.m_currentNode;
-        m_documentPointer = other.m_documentPointer;
-    }
-    return *this;
-}
-
-KestCalmorph::~KestCalmorph() {
-    m_documentPointer.Release();
-    m_currentNode.Release();
-}
-
 // ---------------------------------------------------------------------------------------------
 // Reading
 
