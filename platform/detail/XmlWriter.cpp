@@ -11,38 +11,39 @@ namespace {
 
 constexpr std::string_view kXmlNamespace = "http://www.w3.org/XML/1998/namespace";
 
-// The first character met that XML 1.0 cannot carry (a control character, U+FFFE, U+FFFF),
-// or -1. Per thread, reset by WriteXml.
-thread_local long t_unrepresentable = -1;
-
-void NoteUnrepresentable(long codePoint) {
-    if (t_unrepresentable < 0) t_unrepresentable = codePoint;
-}
+// The text being written, with the first character met that XML 1.0 cannot carry (a control
+// character, U+FFFE, U+FFFF), or -1. One per WriteXml call, so concurrent writes stay apart.
+struct Output : std::string {
+    long unrepresentable = -1;
+    void NoteUnrepresentable(long codePoint) {
+        if (unrepresentable < 0) unrepresentable = codePoint;
+    }
+};
 
 // Notes a character XML 1.0 cannot carry in raw text (CDATA, comments, instructions).
-void CheckRaw(std::string_view text) {
+void CheckRaw(Output& out, std::string_view text) {
     for (std::size_t i = 0; i < text.size(); ++i) {
         unsigned char c = static_cast<unsigned char>(text[i]);
         if (c < 0x20 && c != '\t' && c != '\n' && c != '\r') {
-            NoteUnrepresentable(c);
+            out.NoteUnrepresentable(c);
         } else if (c == 0xEF && i + 2 < text.size() &&
                    static_cast<unsigned char>(text[i + 1]) == 0xBF &&
                    (static_cast<unsigned char>(text[i + 2]) & 0xFE) == 0xBE) {
-            NoteUnrepresentable(0xFFFE + (static_cast<unsigned char>(text[i + 2]) & 1));
+            out.NoteUnrepresentable(0xFFFE + (static_cast<unsigned char>(text[i + 2]) & 1));
         }
     }
 }
 
-void AppendCharRef(std::string& out, unsigned char c) {
-    NoteUnrepresentable(c);
+void AppendCharRef(Output& out, unsigned char c) {
+    out.NoteUnrepresentable(c);
     out += "&#";
     out += std::to_string(static_cast<unsigned>(c));
     out += ';';
 }
 
 // Writes text, escaping what must not appear raw. `attribute` selects the attribute rules.
-void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
-    if (text.find("\xEF\xBF") != std::string_view::npos) CheckRaw(text);  // U+FFFE, U+FFFF
+void AppendEscaped(Output& out, std::string_view text, bool attribute) {
+    if (text.find("\xEF\xBF") != std::string_view::npos) CheckRaw(out, text);  // U+FFFE, U+FFFF
     std::size_t run = 0;
     for (std::size_t i = 0; i < text.size(); ++i) {
         unsigned char c = static_cast<unsigned char>(text[i]);
@@ -85,7 +86,7 @@ void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
     out.append(text.data() + run, text.size() - run);
 }
 
-void AppendAttribute(std::string& out, std::string_view name, std::string_view value) {
+void AppendAttribute(Output& out, std::string_view name, std::string_view value) {
     out += ' ';
     out += name;
     out += "=\"";
@@ -93,21 +94,21 @@ void AppendAttribute(std::string& out, std::string_view name, std::string_view v
     out += '"';
 }
 
-void AppendCdata(std::string& out, std::string_view text) {
+void AppendCdata(Output& out, std::string_view text) {
     // "]]>" cannot appear in a CDATA section and a CR in one reads back as LF. Splitting the
     // section would turn one value into several nodes; as escaped text it stays one value.
     if (text.find("]]>") != std::string_view::npos || text.find('\r') != std::string_view::npos) {
         AppendEscaped(out, text, false);
         return;
     }
-    CheckRaw(text);
+    CheckRaw(out, text);
     out += "<![CDATA[";
     out += text;
     out += "]]>";
 }
 
-void AppendComment(std::string& out, std::string_view text) {
-    CheckRaw(text);
+void AppendComment(Output& out, std::string_view text) {
+    CheckRaw(out, text);
     out += "<!--";
     for (std::size_t i = 0; i < text.size(); ++i) {
         out += text[i];
@@ -116,7 +117,7 @@ void AppendComment(std::string& out, std::string_view text) {
     out += "-->";
 }
 
-void AppendPI(std::string& out, const DomNode* node) {
+void AppendPI(Output& out, const DomNode* node) {
     out += "<?";
     out += node->Name();
     if (node->IsDeclaration()) {
@@ -133,7 +134,7 @@ void AppendPI(std::string& out, const DomNode* node) {
         return;
     }
     std::string_view data = node->Text();
-    CheckRaw(data);
+    CheckRaw(out, data);
     if (!data.empty()) out += ' ';
     std::size_t run = 0;
     for (std::size_t i = 0; i + 1 < data.size(); ++i) {
@@ -176,7 +177,7 @@ class Scope {
 };
 
 // Writes the start tag of `element`; returns the scope mark to restore at its end.
-std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scope) {
+std::size_t AppendStartTag(Output& out, const DomNode* element, Scope& scope) {
     std::size_t mark = scope.Mark();
     out += '<';
     out += element->Name();
@@ -208,7 +209,7 @@ std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scop
     return mark;
 }
 
-void AppendLeaf(std::string& out, const DomNode* node) {
+void AppendLeaf(Output& out, const DomNode* node) {
     switch (node->Type()) {
         case NODE_TEXT:
             AppendEscaped(out, node->Text(), false);
@@ -232,7 +233,7 @@ void AppendLeaf(std::string& out, const DomNode* node) {
 
 constexpr std::size_t kFlushSize = 1024 * 1024;
 
-void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush) {
+void AppendSubtree(Output& out, const DomNode* root, const XmlFlush& flush) {
     Scope scope;
     std::vector<std::size_t> marks;
     const DomNode* node = root;
@@ -269,8 +270,9 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
 
 }  // namespace
 
-long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
-    t_unrepresentable = -1;
+long WriteXml(const DomNode* node, std::string& text, const XmlFlush& flush) {
+    Output out;
+    out.swap(text);
     if (node->Type() != NODE_DOCUMENT) {
         AppendSubtree(out, node, flush);
     } else {
@@ -283,7 +285,8 @@ long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
         flush(out);
         out.clear();
     }
-    return t_unrepresentable;
+    out.swap(text);
+    return out.unrepresentable;
 }
 
 }  // namespace detail
