@@ -42,14 +42,6 @@ class WriteScope {
 
 KestCalmorph::KestCalmorph() = default;
 
-KestCalmorph::KestCalmorph(const KestCalmorph& other) = default;
-KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) = default;
-
-KestCalmorph::~KestCalmorph() {
-    m_documentPointer.Release();
-    m_currentNode.Release();
-}
-
 // ---------------------------------------------------------------------------------------------
 // Reading
 

@@ -23,9 +23,9 @@ constexpr const char* kCdfSchemaFileName = "cdf.xsd";
 class KEST_API KestCalmorph {
   public:
     KestCalmorph();
-    KestCalmorph(const KestCalmorph& other);
-    KestCalmorph& operator=(const KestCalmorph& other);
-    ~KestCalmorph();
+    KestCalmorph(const KestCalmorph& other) = default;
+    KestCalmorph& operator=(const KestCalmorph& other) = default;
+    ~KestCalmorph() = default;
 
     /// Loads the file (validating it against the schema it names) and converts its CAL-DATA
     /// element into the converter's tree; returns a copy of that tree. A file that does not load

@@ -105,7 +105,7 @@ int KestCdfCalData::CountCalList(IXMLDOMNodePtr node) {
     return count;
 }
 
-void KestCdfCalData::ReadChild(IXMLDOMNodePtr child, int& listIndex) {
+void KestCdfCalData::ReadChild(const IXMLDOMNodePtr& child, int& listIndex) {
     if (child->GetnodeType() != NODE_ELEMENT) return;
     const IXMLDOMNode& element = *child;
     auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };

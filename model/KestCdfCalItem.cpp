@@ -30,7 +30,7 @@ int KestCdfCalItem::CountAxisNodes(IXMLDOMNodePtr node) {
     return count;
 }
 
-void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
+void KestCdfCalItem::ReadChild(const IXMLDOMNodePtr& child, int& axisIndex) {
     if (child->GetnodeType() != NODE_ELEMENT) return;
     const IXMLDOMNode& element = *child;
     auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };
@@ -78,7 +78,7 @@ bool KestCdfCalItem::ConvertCalItemNode(IXMLDOMNodePtr node) {
     return true;
 }
 
-void KestCdfCalItem::WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+void KestCdfCalItem::WriteItem(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
                                const KestCdfNormalizedString& ns) {
     if (!doc) throw _com_error(E_POINTER);
     _bstr_t uri(ns.m_string.m_str, true);

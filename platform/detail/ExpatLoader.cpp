@@ -11,6 +11,8 @@
 #include <new>
 #include <vector>
 
+#include "DomNames.h"
+
 namespace kest {
 namespace detail {
 
@@ -113,13 +115,6 @@ struct Builder {
     }
 };
 
-bool IsUtf8Label(const char* name) {
-    std::string lower;
-    for (const char* p = name; *p; ++p)
-        lower += static_cast<char>(*p >= 'A' && *p <= 'Z' ? *p + 32 : *p);
-    return lower == "utf-8" || lower == "utf8";
-}
-
 template <class F>
 void Guard(void* data, F&& body) {
     auto* b = static_cast<Builder*>(data);
@@ -216,7 +211,7 @@ void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* enco
                        int standalone) {
     Guard(data, [&](Builder& b) {
         if (!version || b.current != b.top) return;  // a text declaration of an entity
-        if (b.utf8Bom && encoding && !IsUtf8Label(encoding)) {
+        if (b.utf8Bom && encoding && !IsUtf8EncodingName(encoding)) {
             // expat lets the mark win silently; the document contradicts itself, so refuse it.
             b.Stop(std::string("encoding \"") + encoding +
                    "\" declared after a UTF-8 byte order mark");
