@@ -5,6 +5,7 @@
 
 #include "../core/KestCalmorphDLLError.h"
 #include "KestCdfValueListCodec.h"
+#include "detail/ReadWarnings.h"
 
 namespace kest {
 
@@ -121,6 +122,11 @@ bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {
         std::string_view utf8;
         if (detail::IsFormatType(m_formatType, detail::kFormatNumeric) &&
             child->GetnodeValueUtf8(utf8)) {
+            if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current()) {
+                long line = 0, column = 0;
+                child->GettextPosition(line, column);
+                warnings->SetText(utf8.data(), line, column);
+            }
             _variant_t array =
                 detail::NewValueArray(static_cast<ULONG>(detail::CountValues(true, utf8)));
             detail::FillNumbersUtf8(utf8, detail::NumberTyping::kPerToken, array);
