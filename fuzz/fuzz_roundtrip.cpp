@@ -158,11 +158,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         Fail("written file does not read back: reason " + std::to_string(error.GetReason()));
     }
     if (message.Length() != 0) {
-        // A root that binds no schema instance is read without validation, while the writer
-        // always writes a proper xsi:schemaLocation: the output is then validated and may fail.
-        // The converter's output check reports that; it is no loss of values.
-        const std::string bound = "xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\"";
-        if (std::string(reinterpret_cast<const char*>(data), size).find(bound) == std::string::npos)
+        // A root without a usable schema location (unbound or misspelled) is read without
+        // validation, while the writer always writes a proper one: the output is then
+        // validated and may fail. The converter's check of its output reports that; it is no
+        // loss of values. Anything else the writer wrote must read back.
+        const std::string schema = Folder() + "/cdf.xsd";
+        if (again.ValidateXMLFileWithLocaleXSD(CComBSTR(input.c_str()), CComBSTR(schema.c_str()))
+                .Length() != 0)
             return 0;
         Fail("written file does not load: " + message.ToString());
     }
