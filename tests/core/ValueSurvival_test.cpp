@@ -3,6 +3,7 @@
 // lists, and a root that declares its namespaces in another order.
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <string>
 
 #include "core/KestCalmorph.h"
@@ -115,27 +116,22 @@ TEST(ValueSurvival, CountsBeyondALibraryArrayAreRefused) {
     const std::string out = pipeline.m_dir / "sized.cdf";
     auto write = [&] { return pipeline.m_converter.ConvertCPPToXML(tree, CComBSTR(out.c_str()),
                                                                    CComBSTR()); };
-    const struct {
-        const char* label;
-        std::function<void(int)> set;
-        int length;
-    } rows[] = {
-        {"lists", [&](int n) { tree.SetCalListSize(n); }, 1},
-        {"items", [&](int n) { list.SetCalItemSize(n); }, 2},
-        {"axes", [&](int n) { item.SetAxisSize(n); }, 2},
-        {"changes", [&](int n) { history.SetChangeArraySize(n); tree.SetChangeHistory(history); },
-         1},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.label);
-        row.set(row.length + 1);
+    const std::function<void(int)> setters[] = {
+        [&](int n) { tree.SetCalListSize(n); },
+        [&](int n) { list.SetCalItemSize(n); },
+        [&](int n) { item.SetAxisSize(n); },
+        [&](int n) { history.SetChangeArraySize(n); tree.SetChangeHistory(history); }};
+    const int lengths[] = {1, 2, 2, 1};
+    for (int i = 0; i < 4; ++i) {
+        SCOPED_TRACE(i);
+        setters[i](lengths[i] + 1);
         try {
             write();
-            ADD_FAILURE() << "a count beyond the array was written";
+            ADD_FAILURE() << "written";
         } catch (const _com_error& error) {
             EXPECT_EQ(DISP_E_BADINDEX, error.Error());
         }
-        row.set(row.length);
+        setters[i](lengths[i]);
         EXPECT_TRUE(write());
     }
 }

@@ -50,39 +50,6 @@ TEST(NumberText, WritesPrintfWhereItReadsBackElseAnExactText) {
     }
 }
 
-TEST(NumberText, TokensReadByTheirRules) {
-    const struct {
-        const char* token;
-        bool asDouble;
-        bool isDouble;
-        double number;
-        bool whole;
-        bool overflow;
-    } rows[] = {
-        {"2147483647", false, false, 2147483647.0, true, false},
-        {"2147483648", false, true, 2147483648.0, true, false},
-        {"-2147483648", false, false, -2147483648.0, true, false},
-        {"-2147483649", false, true, -2147483649.0, true, false},
-        {"98O", false, false, 98, false, false},
-        {" 7\t", false, false, 7, true, false},
-        {"", false, false, 0, false, false},
-        {"1.0e999", true, true, INFINITY, true, true},
-        {"-inf", true, true, -INFINITY, true, false},
-        {"1e308", true, true, 1e308, true, false},
-        {"7,60", true, true, 7, false, false},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.token);
-        const char* last = row.token + std::strlen(row.token);
-        const TokenRead read =
-            row.asDouble ? ReadDoubleToken(row.token, last) : ReadIntToken(row.token, last);
-        EXPECT_EQ(row.isDouble, read.isDouble);
-        EXPECT_EQ(row.number, read.isDouble ? read.number : read.integer);
-        EXPECT_EQ(row.whole, read.whole);
-        EXPECT_EQ(row.overflow, read.overflow);
-    }
-}
-
 }  // namespace
 }  // namespace detail
 }  // namespace kest
