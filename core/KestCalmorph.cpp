@@ -87,8 +87,8 @@ KestCdfCalData KestCalmorph::ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CC
                 self.m_readWarningsOmitted = warnings.Omitted();
             } catch (...) {
                 // Out of memory for the copies: the count says what was not kept.
-                self.m_readWarningsOmitted = warnings.Omitted() + warnings.Entries().size() -
-                                             self.m_readWarnings.size();
+                self.m_readWarningsOmitted =
+                    warnings.Omitted() + warnings.Entries().size() - self.m_readWarnings.size();
             }
         }
     } keep{*this, warnings, file};
@@ -208,9 +208,7 @@ void KestCalmorph::SetDocumentPointer(IXMLDOMDocument2Ptr document) {
 // ---------------------------------------------------------------------------------------------
 // Writing
 
-const std::vector<KestReadWarning>& KestCalmorph::GetReadWarnings() const {
-    return m_readWarnings;
-}
+const std::vector<KestReadWarning>& KestCalmorph::GetReadWarnings() const { return m_readWarnings; }
 
 size_t KestCalmorph::GetReadWarningsOmitted() const { return m_readWarningsOmitted; }
 

@@ -24,9 +24,7 @@ namespace {
 }
 
 std::u16string Text(const KestCdfNormalizedString& s) { return s.ToU16String(); }
-std::u16string Text(const CComBSTR& s) {
-    return s.m_str ? u"=" + s.ToU16String() : u"null";
-}
+std::u16string Text(const CComBSTR& s) { return s.m_str ? u"=" + s.ToU16String() : u"null"; }
 std::u16string Text(long long n) {
     const std::string digits = std::to_string(n);
     return std::u16string(digits.begin(), digits.end());
@@ -60,9 +58,9 @@ void SameElement(const VARIANT& a, const VARIANT& b, const std::string& where) {
             Fail(where + ": number type differs");
         return;
     }
-    if (a.vt != b.vt) Fail(where + ": element types " + std::to_string(a.vt) + " and " +
-                           std::to_string(b.vt));
-    if (a.vt == VT_BSTR) if (BstrView(a.bstrVal) != BstrView(b.bstrVal)) Fail(where + " differs");
+    if (a.vt != b.vt)
+        Fail(where + ": element types " + std::to_string(a.vt) + " and " + std::to_string(b.vt));
+    if (a.vt == VT_BSTR && BstrView(a.bstrVal) != BstrView(b.bstrVal)) Fail(where + " differs");
 }
 
 void SameValue(const _variant_t& a, const _variant_t& b, const std::string& where) {

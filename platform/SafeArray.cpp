@@ -197,8 +197,8 @@ HRESULT SafeArrayAccessData(SAFEARRAY* array, void** data) noexcept {
     ULONG locks = __atomic_load_n(&array->cLocks, __ATOMIC_RELAXED);
     do {
         if (locks == std::numeric_limits<ULONG>::max()) return E_UNEXPECTED;
-    } while (!__atomic_compare_exchange_n(&array->cLocks, &locks, locks + 1, true,
-                                          __ATOMIC_ACQUIRE, __ATOMIC_RELAXED));
+    } while (!__atomic_compare_exchange_n(&array->cLocks, &locks, locks + 1, true, __ATOMIC_ACQUIRE,
+                                          __ATOMIC_RELAXED));
     *data = array->pvData;
     return S_OK;
 }
@@ -208,8 +208,8 @@ HRESULT SafeArrayUnaccessData(SAFEARRAY* array) noexcept {
     ULONG locks = __atomic_load_n(&array->cLocks, __ATOMIC_RELAXED);
     do {
         if (locks == 0) return E_UNEXPECTED;
-    } while (!__atomic_compare_exchange_n(&array->cLocks, &locks, locks - 1, true,
-                                          __ATOMIC_RELEASE, __ATOMIC_RELAXED));
+    } while (!__atomic_compare_exchange_n(&array->cLocks, &locks, locks - 1, true, __ATOMIC_RELEASE,
+                                          __ATOMIC_RELAXED));
     return S_OK;
 }
 

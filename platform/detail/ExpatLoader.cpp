@@ -32,7 +32,7 @@ struct Builder {
     bool rootOnly = false;  // stop once the root element's start tag is built
     bool rootSeen = false;
     bool dropBlanksBesideElements = false;
-    std::string text;  // character data not yet turned into a node
+    std::string text;                            // character data not yet turned into a node
     std::uint32_t textLine = 0, textColumn = 0;  // where `text` starts
     // Names repeat throughout a document: a small direct-mapped cache in front of the store's
     // table spares the key building and hashing of most lookups.

@@ -15,8 +15,8 @@ namespace {
 TEST(ThreadedWrite, CopiesOfOneTreeWriteTheSameFileFromEightThreads) {
     test::ScratchDir dir;
     dir.Write("cdf.xsd", test::ReadWholeFile(KEST_SOURCE_DIR "/schema/cdf.xsd"));
-    const std::string input = dir.Write(
-        "in.cdf", test::ReadWholeFile(KEST_SOURCE_DIR "/fuzz/corpus/roundtrip/full.cdf"));
+    const std::string input =
+        dir.Write("in.cdf", test::ReadWholeFile(KEST_SOURCE_DIR "/fuzz/corpus/roundtrip/full.cdf"));
     KestCalmorph reader;
     CComBSTR message;
     const KestCdfCalData tree = reader.ConvertXMLtoCPP(CComBSTR(input.c_str()), true, message);

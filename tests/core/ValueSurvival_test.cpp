@@ -49,14 +49,16 @@ TEST(ValueSurvival, WriteReadWriteKeepsEveryValue) {
         // Item values: the first token and tokens with '.' or a name of a non-finite are doubles.
         {"<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">1.5 1.0e999 -1.0e999 nan -0.0 5</VALUE>",
          ">1.5 inf -inf nan -0.0 5<"},
-        {"<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">0.1 0.30000000000000004 -464.0 0.3</VALUE>",
+        {"<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">0.1 0.30000000000000004 -464.0 "
+         "0.3</VALUE>",
          ">0.1 0.30000000000000004 -464 0.3<"},  // "%.15g" kept where it reads back
         {"<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">"
          "0 2147483647 2147483648 -2147483648 -2147483649 99999999999999999999</VALUE>",
          ">0 2147483647 2147483648.0 -2147483648 -2147483649.0 1.0e+020<"},
         // Axes: one typing for the whole text.
-        {"<AXIS size=\"2\" " + kNumeric + "1.0 1.0e999</AXIS><VALUE sw-units-ref=\"\" "
-         "format-type=\"LABEL\">x</VALUE>",
+        {"<AXIS size=\"2\" " + kNumeric +
+             "1.0 1.0e999</AXIS><VALUE sw-units-ref=\"\" "
+             "format-type=\"LABEL\">x</VALUE>",
          ">1 inf<"},
         {"<AXIS size=\"3\" " + kNumeric + "-0.0 2 nan</AXIS><AXIS size=\"1\" " + kNumeric +
              "3000000000</AXIS><VALUE sw-units-ref=\"\" format-type=\"LABEL\">x</VALUE>",
@@ -66,7 +68,8 @@ TEST(ValueSurvival, WriteReadWriteKeepsEveryValue) {
          "sw-units=\"\" format-type=\"LABEL\"/><VALUE sw-units-ref=\"\" format-type=\"LABEL\"/>",
          "format-type=\"STRING\"></AXIS><AXIS size=\"0\" sw-units=\"\" format-type=\"LABEL\">"
          "</AXIS><VALUE sw-units-ref=\"\" format-type=\"LABEL\"></VALUE>"},
-        {"<VALUE sw-units-ref=\"\" format-type=\"STRING\"></VALUE>", "format-type=\"STRING\">\"\"<"},
+        {"<VALUE sw-units-ref=\"\" format-type=\"STRING\"></VALUE>",
+         "format-type=\"STRING\">\"\"<"},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.content);
@@ -106,21 +109,24 @@ TEST(ValueSurvival, RootNamespacesAreReadByRole) {
 
 TEST(ValueSurvival, CountsBeyondALibraryArrayAreRefused) {
     Pipeline pipeline;
-    pipeline.m_dir.Write("in.cdf", test::ReadWholeFile(KEST_SOURCE_DIR
-                                                       "/fuzz/corpus/roundtrip/full.cdf"));
+    pipeline.m_dir.Write("in.cdf",
+                         test::ReadWholeFile(KEST_SOURCE_DIR "/fuzz/corpus/roundtrip/full.cdf"));
     pipeline.Convert("in.cdf", "out.cdf");
     KestCdfCalData& tree = pipeline.m_tree;
     KestCdfCalList& list = tree.GetCalLists()[0];
     KestCdfCalItem& item = list.GetCalItems()[0];
     KestCdfChangeHistory history = tree.GetChangeHistory();
     const std::string out = pipeline.m_dir / "sized.cdf";
-    auto write = [&] { return pipeline.m_converter.ConvertCPPToXML(tree, CComBSTR(out.c_str()),
-                                                                   CComBSTR()); };
-    const std::function<void(int)> setters[] = {
-        [&](int n) { tree.SetCalListSize(n); },
-        [&](int n) { list.SetCalItemSize(n); },
-        [&](int n) { item.SetAxisSize(n); },
-        [&](int n) { history.SetChangeArraySize(n); tree.SetChangeHistory(history); }};
+    auto write = [&] {
+        return pipeline.m_converter.ConvertCPPToXML(tree, CComBSTR(out.c_str()), CComBSTR());
+    };
+    const std::function<void(int)> setters[] = {[&](int n) { tree.SetCalListSize(n); },
+                                                [&](int n) { list.SetCalItemSize(n); },
+                                                [&](int n) { item.SetAxisSize(n); },
+                                                [&](int n) {
+                                                    history.SetChangeArraySize(n);
+                                                    tree.SetChangeHistory(history);
+                                                }};
     const int lengths[] = {1, 2, 2, 1};
     for (int i = 0; i < 4; ++i) {
         SCOPED_TRACE(i);
@@ -142,8 +148,8 @@ TEST(ValueSurvival, HostDoublesOnAnAxisKeepTheirValue) {
     const struct {
         double given;
         VARTYPE vt;
-    } rows[] = {{3.0, VT_I4},           {1e-5, VT_R8},         {1e20, VT_R8},
-                {0.00005, VT_R8},       {2147483647.0, VT_I4}, {2147483648.0, VT_R8},
+    } rows[] = {{3.0, VT_I4},           {1e-5, VT_R8},          {1e20, VT_R8},
+                {0.00005, VT_R8},       {2147483647.0, VT_I4},  {2147483648.0, VT_R8},
                 {-2147483648.0, VT_I4}, {-2147483649.0, VT_R8}, {-0.0, VT_R8}};
     for (const auto& row : rows) {
         SCOPED_TRACE(row.given);
@@ -157,10 +163,9 @@ TEST(ValueSurvival, HostDoublesOnAnAxisKeepTheirValue) {
 
 TEST(ValueSurvival, NumbersNotTakenWholeAreReported) {
     Pipeline pipeline;
-    pipeline.m_dir.Write("in.cdf",
-                         File(kRoot,
-                              "<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">"
-                              "98O 7,60  abc 1.0e999 3000000000 5 \n 2</VALUE>"));
+    pipeline.m_dir.Write("in.cdf", File(kRoot,
+                                        "<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">"
+                                        "98O 7,60  abc 1.0e999 3000000000 5 \n 2</VALUE>"));
     pipeline.Convert("in.cdf", "out.cdf");
     const std::vector<KestReadWarning>& warnings = pipeline.m_converter.GetReadWarnings();
     // The text starts at line 3, column 46.
