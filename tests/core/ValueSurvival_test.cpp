@@ -190,6 +190,14 @@ TEST(ValueSurvival, NumbersNotTakenWholeAreReported) {
     // Reset on each read: what the library wrote reads without a word.
     pipeline.Convert("out.cdf", "out2.cdf");
     EXPECT_TRUE(pipeline.m_converter.GetReadWarnings().empty());
+    std::string many = "0";
+    for (int i = 0; i < 1002; ++i) many += " x";
+    pipeline.m_dir.Write(
+        "many.cdf",
+        File(kRoot, "<VALUE sw-units-ref=\"\" format-type=\"NUMERIC\">" + many + "</VALUE>"));
+    pipeline.Convert("many.cdf", "out3.cdf");
+    EXPECT_EQ(1000u, pipeline.m_converter.GetReadWarnings().size());
+    EXPECT_EQ(2u, pipeline.m_converter.GetReadWarningsOmitted());
 }
 
 }  // namespace
