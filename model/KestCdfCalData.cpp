@@ -61,7 +61,8 @@ void KestCdfCalData::SetNodeAttributes(IXMLDOMNamedNodeMapPtr attributes) {
             if (!roles[0]) roles[0] = attribute;
         } else if (view.substr(0, 6) == u"xmlns:" && !roles[1]) {
             const _bstr_t value = detail::TakeText(attribute->GetnodeValue());
-            if (BstrView(value) == u"http://www.w3.org/2001/XMLSchema-instance") roles[1] = attribute;
+            if (BstrView(value) == u"http://www.w3.org/2001/XMLSchema-instance")
+                roles[1] = attribute;
         }
     }
     if (roles[0] && roles[1]) {

@@ -1,6 +1,7 @@
 #include "KestCdfCalItem.h"
 
 #include "detail/DomWriting.h"
+#include "KestCdfReadWarnings.h"
 
 #include "../platform/KestCalmorphDLLError.h"
 
@@ -42,6 +43,8 @@ void KestCdfCalItem::ReadChild(const IXMLDOMNodePtr& child, int& axisIndex) {
             while (IXMLDOMNodePtr part = parts->nextNode()) text = TextOf(part);
         }
         m_name.m_string = std::move(text);
+        if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current())
+            warnings->SetItem(m_name.ToString());
     } else if (named(u"AXIS")) {
         if (axisIndex < m_axisSize) m_axes.get()[axisIndex++].ConvertAxisNode(child);
     } else if (named(u"VALUE")) {
@@ -56,6 +59,8 @@ void KestCdfCalItem::ReadChild(const IXMLDOMNodePtr& child, int& axisIndex) {
 }
 
 bool KestCdfCalItem::ConvertCalItemNode(IXMLDOMNodePtr node) {
+    if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current())
+        warnings->SetItem({});
     m_axisSize = CountAxisNodes(node);
     m_axes.AllocateArray(m_axisSize);
     IXMLDOMNodeListPtr children = node->GetchildNodes();

@@ -6,6 +6,7 @@
 #include "../platform/KestCalmorphDLLError.h"
 #include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
+#include "KestCdfReadWarnings.h"
 
 namespace kest {
 
@@ -122,6 +123,11 @@ bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {
         std::string_view utf8;
         if (detail::IsFormatType(m_formatType, detail::kFormatNumeric) &&
             child->GetnodeValueUtf8(utf8)) {
+            if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current()) {
+                long line = 0, column = 0;
+                child->GettextPosition(line, column);
+                warnings->SetText(utf8.data(), line, column);
+            }
             _variant_t array =
                 detail::NewValueArray(static_cast<ULONG>(detail::CountValues(true, utf8)));
             detail::FillNumbersUtf8(utf8, detail::NumberTyping::kPerToken, array);

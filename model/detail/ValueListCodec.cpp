@@ -1,6 +1,6 @@
 #include "ValueListCodec.h"
 
-#include "ReadWarnings.h"
+#include "../KestCdfReadWarnings.h"
 
 #include <locale.h>
 #include <stdlib.h>

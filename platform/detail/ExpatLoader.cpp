@@ -35,7 +35,8 @@ struct Builder {
     bool rootSeen = false;
     bool hasDoctype = false;
     bool dropBlanksBesideElements = false;
-    std::string text;  // character data not yet turned into a node
+    std::string text;                            // character data not yet turned into a node
+    std::uint32_t textLine = 0, textColumn = 0;  // where `text` starts
     // Names repeat throughout a document: a small direct-mapped cache in front of the store's
     // table spares the key building and hashing of most lookups.
     const DomName* nameCache[512] = {};
@@ -110,6 +111,7 @@ struct Builder {
         } else {
             store->SetText(node, text);
         }
+        node->SetTextPosition(textLine, textColumn);
         LinkChild(current, node);
         text.clear();
     }
@@ -166,7 +168,13 @@ void XMLCALL OnEnd(void* data, const XML_Char*) {
 }
 
 void XMLCALL OnCharacters(void* data, const XML_Char* s, int len) {
-    Guard(data, [&](Builder& b) { b.text.append(s, static_cast<std::size_t>(len)); });
+    Guard(data, [&](Builder& b) {
+        if (b.text.empty()) {
+            b.textLine = static_cast<std::uint32_t>(XML_GetCurrentLineNumber(b.parser));
+            b.textColumn = static_cast<std::uint32_t>(XML_GetCurrentColumnNumber(b.parser)) + 1;
+        }
+        b.text.append(s, static_cast<std::size_t>(len));
+    });
 }
 
 void XMLCALL OnCdataStart(void* data) {
@@ -180,6 +188,7 @@ void XMLCALL OnCdataEnd(void* data) {
     Guard(data, [&](Builder& b) {
         DomNode* node = b.store->NewNode(NODE_CDATA_SECTION);
         b.store->SetText(node, b.text);
+        node->SetTextPosition(b.textLine, b.textColumn);
         b.text.clear();
         LinkChild(b.current, node);
         b.inCdata = false;
