@@ -409,9 +409,9 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
                        bool preserveWhiteSpace) noexcept {
     ParsedContent result;
     error = DomError();
-    error.url = url;
     XML_Parser parser = nullptr;
     try {
+        error.url = url;
         result.store = std::make_unique<DomStore>();
         result.top = result.store->NewNode(NODE_DOCUMENT);
         parser = XML_ParserCreate(forcedEncoding);
@@ -492,8 +492,12 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
     } catch (...) {
         if (parser) XML_ParserFree(parser);
         error.code = E_OUTOFMEMORY;
-        error.reason = "out of memory while loading";
-        if (!url.empty()) error.reason += " " + url;
+        // Short of memory, the reason may be all that can be said.
+        try {
+            error.reason = "out of memory while loading";
+            if (!url.empty()) error.reason += " " + url;
+        } catch (...) {
+        }
         return ParsedContent();
     }
 }
