@@ -173,7 +173,7 @@ struct DomDocument {
     std::string schemaPath;              // "SchemaPath": validate against this schema instead
     bool builtinSchemaFallback = false;  // "BuiltinSchemaFallback"
     bool usedBuiltinSchema = false;      // "UsedBuiltinSchema": the last load or validation did
-    long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
+    long maxElementDepth = 0;            // 0: kDefaultMaxElementDepth
     ComPtr<IXMLDOMSchemaCollection> schemas;
     DomError error;
     std::string url;  // where the current content was loaded from
