@@ -82,7 +82,8 @@ void KestCalmorph::RecordLoadResult(const IXMLDOMParseErrorPtr& result,
     // The parse error gives 0 both for the first byte and for "unknown".
     error.offset = offset > 0 || (error.line == 1 && error.column == 1) ? offset : -1;
     std::string url = result->Geturl().ToString();
-    error.file = url.empty() ? path.ToString() : url;
+    // A position inside another file (a schema) names that file; otherwise the path as given.
+    error.file = error.line > 0 && !url.empty() ? url : path.ToString();
     error.reason = result->GetreasonText().ToString();
     switch (result->Getcause()) {
         case DOM_CAUSE_UNKNOWN_ENCODING:
