@@ -47,6 +47,9 @@ KestCalmorph::KestCalmorph(const KestCalmorph& other)
       m_writeDocument(other.m_writeDocument),
       m_currentNode(other.m_currentNode),
       m_documentPointer(other.m_documentPointer),
+      m_readOptions(other.m_readOptions),
+      m_lastLoadError(other.m_lastLoadError),
+      m_usedBuiltinSchema(other.m_usedBuiltinSchema),
       m_writeOptions(other.m_writeOptions) {}
 
 KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
@@ -55,6 +58,9 @@ KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
         m_writeDocument = other.m_writeDocument;
         m_currentNode = other.m_currentNode;
         m_documentPointer = other.m_documentPointer;
+        m_readOptions = other.m_readOptions;
+        m_lastLoadError = other.m_lastLoadError;
+        m_usedBuiltinSchema = other.m_usedBuiltinSchema;
         m_writeOptions = other.m_writeOptions;
     }
     return *this;
@@ -68,7 +74,58 @@ KestCalmorph::~KestCalmorph() {
 // ---------------------------------------------------------------------------------------------
 // Reading
 
+void KestCalmorph::SetReadOptions(const KestReadOptions& options) { m_readOptions = options; }
+
+const KestReadOptions& KestCalmorph::GetReadOptions() const { return m_readOptions; }
+
+bool KestCalmorph::UsedBuiltinSchema() const { return m_usedBuiltinSchema; }
+
+const KestLoadError& KestCalmorph::GetLastLoadError() const { return m_lastLoadError; }
+
+void KestCalmorph::PrepareReadDocument(const IXMLDOMDocument2Ptr& document, bool validate) const {
+    document->PutvalidateOnParse(validate ? VARIANT_TRUE : VARIANT_FALSE);
+    document->setProperty(_bstr_t(u"ServerHTTPRequest"), _variant_t(m_readOptions.allowNetwork));
+    document->setProperty(_bstr_t(u"SchemaPath"), _variant_t(m_readOptions.schemaPath));
+    document->setProperty(_bstr_t(u"BuiltinSchemaFallback"),
+                          _variant_t(m_readOptions.builtinSchemaFallback));
+}
+
+void KestCalmorph::RecordLoadResult(const IXMLDOMParseErrorPtr& result,
+                                    const IXMLDOMDocument2Ptr& document, const CComBSTR& path) {
+    m_lastLoadError = KestLoadError();
+    m_usedBuiltinSchema = false;
+    if (!result) return;
+    long code = result->GeterrorCode();
+    if (code == 0) {
+        m_usedBuiltinSchema =
+            static_cast<bool>(document->getProperty(_bstr_t(u"UsedBuiltinSchema")));
+        return;
+    }
+    KestLoadError& error = m_lastLoadError;
+    error.code = code;
+    error.line = result->Getline();
+    error.column = result->Getlinepos();
+    long offset = result->Getfilepos();
+    // The parse error gives 0 both for the first byte and for "unknown".
+    error.offset = offset > 0 || (error.line == 1 && error.column == 1) ? offset : -1;
+    std::string url = result->Geturl().ToString();
+    error.file = url.empty() ? path.ToString() : url;
+    error.reason = result->GetreasonText().ToString();
+    switch (result->Getcause()) {
+        case DOM_CAUSE_UNKNOWN_ENCODING:
+            error.hint = "save the file as UTF-8";
+            break;
+        case DOM_CAUSE_SCHEMA_UNAVAILABLE:
+            error.hint = "use --schema or --no-validate";
+            break;
+        default:
+            break;
+    }
+}
+
 KestCdfCalData KestCalmorph::ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CComBSTR& message) {
+    m_lastLoadError = KestLoadError();
+    m_usedBuiltinSchema = false;
     CComBSTR result = LoadXMLFile(std::move(path), IXMLDOMDocument2Ptr(), wantMessage);
     // Assigned only once the load returned, so that an exception leaves the caller's text alone.
     message = std::move(result);
@@ -84,6 +141,8 @@ CComBSTR KestCalmorph::LoadXMLFile(CComBSTR path, IXMLDOMDocument2Ptr document, 
         // Indentation between elements is never part of a CDF value; not keeping it as nodes
         // saves a good part of the document's memory and walking time on large files.
         document->PutpreserveWhiteSpace(VARIANT_FALSE);
+        // Validate-on-parse stays on unless the host switched validation off.
+        PrepareReadDocument(document, m_readOptions.validate);
 
         VARIANT_BOOL loaded = VARIANT_FALSE;
         try {
@@ -96,10 +155,12 @@ CComBSTR KestCalmorph::LoadXMLFile(CComBSTR path, IXMLDOMDocument2Ptr document, 
         if (loaded != VARIANT_FALSE) {
             IXMLDOMParseErrorPtr parseError = document->GetparseError();
             if (parseError->GeterrorCode() != 0) message = CComBSTR(parseError->Getreason().View());
+            RecordLoadResult(parseError, document, path);
         } else {
             IXMLDOMParseErrorPtr parseError = document->GetparseError();
             if (!parseError) throw E_POINTER;
             message = CComBSTR(parseError->Getreason().View());
+            RecordLoadResult(parseError, document, path);
         }
 
         // After a failed load the document is empty, so the walk converts nothing and the tree

@@ -8,6 +8,8 @@
 #include "../platform/CComBSTR.h"
 #include "../platform/XmlDom.h"
 #include "KestCalmorphDLLError.h"
+#include "KestLoadError.h"
+#include "KestReadOptions.h"
 #include "KestWriteOptions.h"
 
 namespace kest {
@@ -63,6 +65,15 @@ class KestCalmorph {
     /// valid, "FAIL" when the data file did not load without a reason, else the reason.
     CComBSTR ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR schemaPath);
 
+    /// Extension: how this converter reads and checks files (validation, network, schema).
+    void SetReadOptions(const KestReadOptions& options);
+    /// Extension: the read options in force.
+    const KestReadOptions& GetReadOptions() const;
+    /// Extension: true when the last read was validated against the built-in copy of cdf.xsd.
+    bool UsedBuiltinSchema() const;
+    /// Extension: why the last read or validation failed (code 0 when it loaded); reset by each.
+    const KestLoadError& GetLastLoadError() const;
+
     /// True when a server file name (the text after the last '\\' or '/') reads as "msxml"
     /// followed by a plain decimal version (digits, optional fraction) of at least 4.0.
     static bool IsSupportedServerFileName(const char* fileName);
@@ -78,11 +89,20 @@ class KestCalmorph {
     /// The directory part of `path`, up to and including its last '/' or '\\'; empty when it
     /// has neither.
     std::string GetFilePath(CComBSTR path);
+    /// Applies the read options to a document about to load a file.
+    void PrepareReadDocument(const IXMLDOMDocument2Ptr& document, bool validate) const;
+    /// Records the outcome of a load or validation as the last load error (and whether the
+    /// built-in schema served).
+    void RecordLoadResult(const IXMLDOMParseErrorPtr& result, const IXMLDOMDocument2Ptr& document,
+                          const CComBSTR& path);
 
     KestCdfCalData m_calData;
     IXMLDOMDocument* m_writeDocument = nullptr;
     IXMLDOMNodePtr m_currentNode;
     IXMLDOMDocument2Ptr m_documentPointer;
+    KestReadOptions m_readOptions;
+    KestLoadError m_lastLoadError;
+    bool m_usedBuiltinSchema = false;
     KestWriteOptions m_writeOptions;
 };
 

@@ -88,6 +88,8 @@ std::string KestCalmorph::GetFilePath(CComBSTR path) {
 
 CComBSTR KestCalmorph::DetectSchemaLocation(CComBSTR path, CComBSTR& message) {
     message = u"";
+    m_lastLoadError = KestLoadError();
+    m_usedBuiltinSchema = false;
     IXMLDOMDocument2Ptr document;
     HRESULT hr = document.CreateInstance(kProgIdDOMDocument40);
     if (FAILED(hr)) throw hr;
@@ -96,9 +98,11 @@ CComBSTR KestCalmorph::DetectSchemaLocation(CComBSTR path, CComBSTR& message) {
     } catch (const _com_error&) {
         return CComBSTR(u"");
     }
-    document->PutvalidateOnParse(VARIANT_TRUE);
+    PrepareReadDocument(document, m_readOptions.validate);
 
-    if (document->load(_variant_t(static_cast<const OLECHAR*>(path))) != VARIANT_FALSE) {
+    bool loaded = document->load(_variant_t(static_cast<const OLECHAR*>(path))) != VARIANT_FALSE;
+    RecordLoadResult(document->GetparseError(), document, path);
+    if (loaded) {
         IXMLDOMElementPtr root = document->GetdocumentElement();
         IXMLDOMAttributePtr attribute = root->getAttributeNode(_bstr_t(kSchemaLocationAttribute));
         if (!attribute) KestCalmorphDLLError::Raise(reason::kSchemaLocationAbsent);
@@ -127,7 +131,8 @@ bool KestCalmorph::IsSchemaLocationValid(CComBSTR location, CComBSTR path) {
         HRESULT hr = document.CreateInstance(kProgIdDOMDocument40);
         if (FAILED(hr)) throw hr;
         document->Putasync(VARIANT_FALSE);
-        document->setProperty(_bstr_t(u"ServerHTTPRequest"), _variant_t(true));
+        document->setProperty(_bstr_t(u"ServerHTTPRequest"),
+                              _variant_t(m_readOptions.allowNetwork));
         return document->load(_variant_t(static_cast<const OLECHAR*>(location))) != VARIANT_FALSE;
     }
     if (location.View() == std::u16string_view(u"cdf.xsd")) {
@@ -138,6 +143,8 @@ bool KestCalmorph::IsSchemaLocationValid(CComBSTR location, CComBSTR path) {
 
 CComBSTR KestCalmorph::ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR schemaPath) {
     CComBSTR message(u"");
+    m_lastLoadError = KestLoadError();
+    m_usedBuiltinSchema = false;
     if (dataPath == nullptr) throw _com_error(E_POINTER);
 
     IXMLDOMDocument2Ptr data;
@@ -150,15 +157,19 @@ CComBSTR KestCalmorph::ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR 
         IXMLDOMDocument2Ptr schema;
         if (FAILED(schema.CreateInstance(kClsidDOMDocument40))) throw _com_error(E_POINTER);
         schema->Putasync(VARIANT_FALSE);
+        schema->setProperty(_bstr_t(u"ServerHTTPRequest"), _variant_t(m_readOptions.allowNetwork));
         if (schema->load(_variant_t(static_cast<const OLECHAR*>(schemaPath))) != VARIANT_FALSE) {
             IXMLDOMSchemaCollectionPtr cache;
             cache.CreateInstance(kProgIdXMLSchemaCache40);
+            cache->PutserverHttpRequest(m_readOptions.allowNetwork);
             cache->add(_bstr_t(kCdfNamespaceURI),
                        _variant_t(static_cast<const OLECHAR*>(schemaPath)));
             data->putref_schemas(cache);
             IXMLDOMParseErrorPtr result = data->validate();
             message = CComBSTR(result->Getreason().View());
+            RecordLoadResult(result, data, dataPath);
         } else {
+            RecordLoadResult(schema->GetparseError(), schema, schemaPath);
             IXMLDOMParseErrorPtr parseError = data->GetparseError();
             if (!parseError) throw E_POINTER;
             if (parseError->GeterrorCode() == 0)
@@ -166,6 +177,7 @@ CComBSTR KestCalmorph::ValidateXMLFileWithLocaleXSD(CComBSTR dataPath, CComBSTR 
             message = CComBSTR(parseError->Getreason().View());
         }
     } else {
+        RecordLoadResult(data->GetparseError(), data, dataPath);
         message = ParseErrorReason(data);
         if (message.Length() == 0) message = u"FAIL";
     }

@@ -129,14 +129,22 @@ _variant_t KestCdfAxis::PutNumbersIntoSafeArray(const _variant_t& value, _varian
         detail::FillNumbers(BstrView(value.bstrVal), detail::NumberTyping::kWholeText, array);
         return array;
     }
-    // A number given by the host is split as its "%.15g" text: 3.0 becomes the integer 3,
-    // 2.5 the double 2.5. Values of other kinds are taken by their numeric value.
-    char narrow[detail::kDoubleTextCapacity];
-    const char* end = detail::FormatDouble(static_cast<double>(value), narrow);
-    char16_t wide[detail::kDoubleTextCapacity];
-    std::size_t length = 0;
-    for (const char* p = narrow; p != end; ++p) wide[length++] = static_cast<char16_t>(*p);
-    detail::FillNumbers(std::u16string_view(wide, length), detail::NumberTyping::kWholeText, array);
+    // A number given by the host: a whole number within the 32-bit range becomes the integer
+    // (3.0 gives 3), any other double stays a double with its value. Values of other kinds are
+    // taken by their numeric value.
+    const double number = static_cast<double>(value);
+    VARIANT element;
+    VariantInit(&element);
+    if (number == std::trunc(number) && number >= INT_MIN && number <= INT_MAX &&
+        !(number == 0.0 && std::signbit(number))) {
+        element.vt = VT_I4;
+        element.lVal = static_cast<LONG>(number);
+    } else {
+        element.vt = VT_R8;
+        element.dblVal = number;
+    }
+    const LONG index = 0;
+    ThrowIfFailed(SafeArrayPutElement(array.parray, &index, &element));
     return array;
 }
 
@@ -154,6 +162,14 @@ bool KestCdfAxis::ConvertAxisNode(IXMLDOMNodePtr node) {
     if (!node) throw _com_error(E_POINTER);
     SetAxisAttributes(node->Getattributes());
     IXMLDOMNodeListPtr children = node->GetchildNodes();
+    // What the writer writes for a STRING axis of no points or an empty LABEL is an element
+    // without children: read it as the setter's value for the empty text, so that it is
+    // written again.
+    if (!children->Getlength() && (detail::IsFormatType(m_formatType, detail::kFormatString) ||
+                                   detail::IsFormatType(m_formatType, detail::kFormatLabel))) {
+        SetAxisValue(_variant_t(u""));
+        return true;
+    }
     // Every child replaces the value, so the last one decides.
     for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
         // Numbers are parsed from the text as the DOM stores it: SetAxisValue's result for the

@@ -1,6 +1,10 @@
 #include "KestCdfCalData.h"
 
 #include "KestCdfDomWriting.h"
+#include "KestCdfValueListCodec.h"
+
+#include <string>
+#include <string_view>
 
 #include "../core/KestCalmorphDLLError.h"
 
@@ -42,7 +46,44 @@ _bstr_t KestCdfCalData::GetNodeString(IXMLDOMNodePtr node) {
 
 void KestCdfCalData::SetNodeAttributes(IXMLDOMNamedNodeMapPtr attributes) {
     if (!attributes) KestCalmorphDLLError::Raise(reason::kCalDataNoAttributeMap);
-    // By position, whatever the names: namespace, schema instance, schema location.
+    // By role when the root has all three, in any order: "xmlns" is the namespace, an
+    // "xmlns:P" naming the schema-instance URI the schema instance, and "P:schemaLocation" or
+    // "P:noNamespaceSchemaLocation" the location. Reading them by position would swap the
+    // namespaces of a root that declares xmlns:xsi first.
+    IXMLDOMNodePtr roles[3];
+    const long count = attributes->Getlength();
+    for (long i = 0; i < count; ++i) {
+        IXMLDOMNodePtr attribute = attributes->Getitem(i);
+        if (!attribute || attribute->GetnodeType() != NODE_ATTRIBUTE) continue;
+        const _bstr_t name = attribute->GetnodeName();
+        const std::u16string_view view = BstrView(name);
+        if (view == u"xmlns") {
+            if (!roles[0]) roles[0] = attribute;
+        } else if (view.substr(0, 6) == u"xmlns:" && !roles[1]) {
+            const _bstr_t value = detail::TakeText(attribute->GetnodeValue());
+            if (BstrView(value) == u"http://www.w3.org/2001/XMLSchema-instance") roles[1] = attribute;
+        }
+    }
+    if (roles[0] && roles[1]) {
+        const _bstr_t instanceName = roles[1]->GetnodeName();
+        const std::u16string prefix(BstrView(instanceName).substr(6));
+        for (long i = 0; i < count && !roles[2]; ++i) {
+            IXMLDOMNodePtr attribute = attributes->Getitem(i);
+            if (!attribute || attribute->GetnodeType() != NODE_ATTRIBUTE) continue;
+            const _bstr_t name = attribute->GetnodeName();
+            const std::u16string_view view = BstrView(name);
+            if (view == prefix + u":schemaLocation" ||
+                view == prefix + u":noNamespaceSchemaLocation")
+                roles[2] = attribute;
+        }
+    }
+    if (roles[0] && roles[1] && roles[2]) {
+        m_namespace = GetNodeString(roles[0]);
+        m_schemaInstance = GetNodeString(roles[1]);
+        m_schemaLocation = GetNodeString(roles[2]);
+        return;
+    }
+    // Otherwise by position, whatever the names: namespace, schema instance, schema location.
     m_namespace = GetNodeString(attributes->nextNode());
     m_schemaInstance = GetNodeString(attributes->nextNode());
     m_schemaLocation = GetNodeString(attributes->nextNode());
@@ -132,9 +173,9 @@ bool KestCdfCalData::ConvertCalDataNodeToXML(IXMLDOMDocument* doc, CComBSTR comm
     }
     if (m_note != nullptr) AppendTextElement(root, doc, u"NOTE", uri, m_note);
     SetXMLAttributes(root);
-    if (m_calListSize > 0 && !m_calLists.get()) throw _com_error(E_POINTER);
+    KestCdfCalList* const lists = m_calLists.Checked(m_calListSize);
     for (int i = 0; i < m_calListSize; ++i) {
-        m_calLists.get()[i].ConvertCalListNodeToXML(root, doc, m_namespace);
+        lists[i].ConvertCalListNodeToXML(root, doc, m_namespace);
     }
     return true;
 }

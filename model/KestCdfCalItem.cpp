@@ -85,8 +85,8 @@ void KestCdfCalItem::WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
     IXMLDOMNodePtr item = AppendElement(parent, doc, u"CAL-ITEM", uri);
     if (m_name.m_string == nullptr) KestCalmorphDLLError::Raise(reason::kCalItemNameMissing);
     AppendTextElement(item, doc, u"NAME", uri, m_name.m_string);
-    if (m_axisSize > 0 && !m_axes.get()) throw _com_error(E_POINTER);
-    for (int i = 0; i < m_axisSize; ++i) m_axes.get()[i].ConvertAxisNodeToXML(item, doc, ns);
+    KestCdfAxis* const axes = m_axes.Checked(m_axisSize);
+    for (int i = 0; i < m_axisSize; ++i) axes[i].ConvertAxisNodeToXML(item, doc, ns);
     if (!m_value.get()) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
     m_value.get()->ConvertCalItemValueNodeToXML(item, doc, ns);
     if (m_annotation != nullptr) AppendTextElement(item, doc, u"ANNOTATION", uri, m_annotation);

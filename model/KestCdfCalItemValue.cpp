@@ -112,6 +112,14 @@ bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {
     if (!node) throw _com_error(E_POINTER);
     SetCalItemValueAttributes(node->Getattributes());
     IXMLDOMNodeListPtr children = node->GetchildNodes();
+    // An empty LABEL or STRING value is written as an element without children: read it as
+    // the setter's value for the empty text (one empty string), so that it is written again.
+    if (!children->Getlength() && (detail::IsFormatType(m_formatType, detail::kFormatString) ||
+                                   detail::IsFormatType(m_formatType, detail::kFormatLabel))) {
+        m_fromDocument = 1;
+        SetValue(_variant_t(u""));
+        return true;
+    }
     // Every child replaces the value, so the last one decides.
     for (IXMLDOMNodePtr child = children->nextNode(); child; child = children->nextNode()) {
         m_fromDocument = 1;

@@ -96,9 +96,9 @@ bool KestCdfCalList::ConvertCalListNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocum
     m_symbolicFile.get()->ConvertSymbolicFileNodeToXML(list, doc, ns);
     if (m_targetImage.get()) m_targetImage.get()->ConvertTargetImageFileNodeToXML(list, doc, ns);
     if (m_note != nullptr) AppendTextElement(list, doc, u"NOTE", uri, m_note);
-    if (m_calItemSize > 0 && !m_calItems.get()) throw _com_error(E_POINTER);
+    KestCdfCalItem* const items = m_calItems.Checked(m_calItemSize);
     for (int i = 0; i < m_calItemSize; ++i) {
-        m_calItems.get()[i].ConvertCalItemNodeToXML(list, doc, ns);
+        items[i].ConvertCalItemNodeToXML(list, doc, ns);
     }
     return true;
 }

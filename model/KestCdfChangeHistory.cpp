@@ -48,8 +48,8 @@ bool KestCdfChangeHistory::ConvertChangeHistoryToXML(IXMLDOMNodePtr parent, IXML
     IXMLDOMNodePtr history = doc->createNode(_variant_t(static_cast<int>(NODE_ELEMENT)),
                                              _bstr_t(u"CHANGE-HISTORY"), uri);
     parent->appendChild(history);
-    if (m_count > 0 && !m_changes.get()) throw _com_error(E_POINTER);
-    for (int i = 0; i < m_count; ++i) m_changes.get()[i].ConvertChangeToXML(history, doc, ns);
+    KestCdfChange* const changes = m_changes.Checked(m_count);
+    for (int i = 0; i < m_count; ++i) changes[i].ConvertChangeToXML(history, doc, ns);
     return true;
 }
 

@@ -1,5 +1,9 @@
 #include "KestCdfDomWriting.h"
 
+#include <climits>
+#include <cstdint>
+#include <cstring>
+
 namespace kest {
 namespace detail {
 
@@ -50,6 +54,51 @@ void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes
     IXMLDOMAttributePtr attribute = doc->createAttribute(_bstr_t(name));
     attribute->PutnodeValue(_variant_t(_bstr_t(BstrView(value))));
     attributes->setNamedItem(attribute);
+}
+
+void ReadFileReferenceName(const IXMLDOMNodePtr& node, KestCdfNormalizedString& fileName) {
+    IXMLDOMNodeListPtr children = node->GetchildNodes();
+    if (!children) return;
+    while (IXMLDOMNodePtr child = children->nextNode())
+        fileName.m_string = CComBSTR(_bstr_t(child->GetnodeValue()).View());
+}
+
+namespace {
+
+int DigitValue(char c) noexcept {
+    if (c >= '0' && c <= '9') return c - '0';
+    if (c >= 'a' && c <= 'f') return c - 'a' + 10;
+    if (c >= 'A' && c <= 'F') return c - 'A' + 10;
+    return 99;
+}
+
+}  // namespace
+
+int ParseCrc(const char* text) noexcept {
+    if (!text) return 0;
+    const unsigned base = std::strchr(text, 'x') ? 16 : 10;
+    const char* p = text;
+    while (*p == ' ' || (*p >= '\t' && *p <= '\r')) ++p;
+    bool negative = false;
+    if (*p == '+' || *p == '-') {
+        negative = *p == '-';
+        ++p;
+    }
+    if (base == 16 && p[0] == '0' && (p[1] == 'x' || p[1] == 'X') && DigitValue(p[2]) < 16) p += 2;
+    std::uint64_t value = 0;
+    for (unsigned digit; (digit = static_cast<unsigned>(DigitValue(*p))) < base; ++p) {
+        value = value * base + digit;
+        if (value > 0xFFFFFFFFu) {
+            value = 0xFFFFFFFFu;  // saturated: the sign no longer matters
+            negative = false;
+            break;
+        }
+    }
+    std::uint32_t bits = static_cast<std::uint32_t>(value);
+    if (negative) bits = 0u - bits;
+    // The int with the same 32 bits, without relying on implementation-defined narrowing.
+    if (bits <= static_cast<std::uint32_t>(INT_MAX)) return static_cast<int>(bits);
+    return static_cast<int>(bits - 0x80000000u) + INT_MIN;
 }
 
 }  // namespace detail

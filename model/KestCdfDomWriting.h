@@ -3,6 +3,7 @@
 
 #include "../platform/Automation.h"
 #include "../platform/XmlDom.h"
+#include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 namespace detail {
@@ -21,6 +22,16 @@ IXMLDOMNodePtr AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* 
 /// attribute. False when the new element offers no attribute map (the element stays).
 bool AppendFileReference(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
                          const _bstr_t& ns, BSTR fileName, const char* crcText);
+
+/// Reads the text of a SYMBOLIC-FILE or TARGET-IMAGE element: the last child's value stands;
+/// an element without children leaves `fileName` as it was.
+void ReadFileReferenceName(const IXMLDOMNodePtr& node, KestCdfNormalizedString& fileName);
+
+/// The 32 bits of a crc32 text, read as strtoul reads it on a 32-bit unsigned long: base 16
+/// when the text holds an 'x' anywhere, else base 10; white space and a sign first (a minus
+/// negates modulo 2^32); digits stop at the first other character; a number beyond 32 bits
+/// gives 0xFFFFFFFF. The result is the int with those bits.
+int ParseCrc(const char* text) noexcept;
 
 /// A node's value as owned text; an element's (null) value throws _com_error.
 CComBSTR TextOf(const IXMLDOMNodePtr& node);

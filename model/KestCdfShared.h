@@ -14,6 +14,9 @@
 #include <memory>
 #include <new>
 
+#include "../platform/ComError.h"
+#include "../platform/HResult.h"
+
 namespace kest {
 namespace detail {
 
@@ -22,14 +25,18 @@ class SharedAllocation {
   public:
     virtual ~SharedAllocation();
     const void* Address() const noexcept { return m_address; }
+    /// Number of objects allocated.
+    std::size_t Length() const noexcept { return m_length; }
     /// Enters the allocation in the registry once, so a setter can find it.
     void Publish(const std::shared_ptr<SharedAllocation>& self);
 
   protected:
-    explicit SharedAllocation(const void* address) noexcept : m_address(address) {}
+    SharedAllocation(const void* address, std::size_t length) noexcept
+        : m_address(address), m_length(length) {}
 
   private:
     const void* m_address;
+    std::size_t m_length;
     std::atomic<bool> m_published{false};
 };
 
@@ -40,7 +47,7 @@ std::shared_ptr<SharedAllocation> FindLibraryAllocation(const void* p);
 template <class T, bool IsArray>
 class TypedAllocation final : public SharedAllocation {
   public:
-    explicit TypedAllocation(T* p) noexcept : SharedAllocation(p), m_p(p) {}
+    TypedAllocation(T* p, std::size_t length) noexcept : SharedAllocation(p, length), m_p(p) {}
     ~TypedAllocation() override {
         if (IsArray)
             delete[] m_p;
@@ -70,7 +77,8 @@ class SharedChild {
     T* AllocateArray(int count) {
         if (count < 0) throw std::bad_array_new_length();
         std::unique_ptr<T[]> array(new T[static_cast<std::size_t>(count)]);
-        m_owner = std::make_shared<TypedAllocation<T, true>>(array.get());
+        m_owner = std::make_shared<TypedAllocation<T, true>>(array.get(),
+                                                             static_cast<std::size_t>(count));
         m_ptr = array.release();
         return m_ptr;
     }
@@ -78,8 +86,19 @@ class SharedChild {
     /// Allocates one default-constructed object and holds it.
     T* AllocateObject() {
         std::unique_ptr<T> object(new T());
-        m_owner = std::make_shared<TypedAllocation<T, false>>(object.get());
+        m_owner = std::make_shared<TypedAllocation<T, false>>(object.get(), 1);
         m_ptr = object.release();
+        return m_ptr;
+    }
+
+    /// The array for `count` objects: throws _com_error(E_POINTER) when there is none and
+    /// `count` is positive, DISP_E_BADINDEX when the library allocated it with fewer objects (a
+    /// host's own array has a length the library cannot know).
+    T* Checked(long long count) const {
+        if (count <= 0) return m_ptr;
+        if (!m_ptr) throw _com_error(E_POINTER);
+        if (m_owner && static_cast<unsigned long long>(count) > m_owner->Length())
+            throw _com_error(DISP_E_BADINDEX);
         return m_ptr;
     }
 

@@ -7,7 +7,7 @@
 
 namespace kest {
 
-int KestCdfTargetImage::atohd(const char* text) { return KestCdfSymbolicFile::atohd(text); }
+int KestCdfTargetImage::atohd(const char* text) { return detail::ParseCrc(text); }
 
 void KestCdfTargetImage::hdtoa(unsigned int value, char* buffer) {
     KestCdfSymbolicFile::hdtoa(value, buffer);
@@ -38,11 +38,7 @@ void KestCdfTargetImage::SetTargetImageAttributes(IXMLDOMNamedNodeMapPtr attribu
 
 bool KestCdfTargetImage::ConvertTargetImageFileNode(IXMLDOMNodePtr node) {
     SetTargetImageAttributes(node->Getattributes());
-    IXMLDOMNodeListPtr children = node->GetchildNodes();
-    if (!children) return true;
-    while (IXMLDOMNodePtr child = children->nextNode()) {
-        m_fileName.m_string = CComBSTR(_bstr_t(child->GetnodeValue()).View());
-    }
+    detail::ReadFileReferenceName(node, m_fileName);
     return true;
 }
 

@@ -1,5 +1,7 @@
 #include "KestCdfValueListCodec.h"
 
+#include "detail/ReadWarnings.h"
+
 #include <locale.h>
 #include <stdlib.h>
 #include <algorithm>
@@ -22,14 +24,6 @@ namespace {
 
 constexpr VARTYPE kArrayOfVariants = VT_ARRAY | VT_VARIANT;
 
-// The white-space set of isspace in the C locale; the host's locale must not change what a
-// file means.
-inline bool IsCSpace(char c) noexcept { return c == ' ' || (c >= '\t' && c <= '\r'); }
-
-inline bool IsDigit(char c) noexcept { return c >= '0' && c <= '9'; }
-
-inline char LowerAscii(char c) noexcept { return static_cast<char>(c | 0x20); }
-
 // Tokens are parsed as narrow characters, one byte per UTF-16 unit so that positions match
 // the text. A unit outside ASCII can never be part of a number, so one placeholder byte that is
 // neither white space, digit, sign nor letter stands in for all: the narrowing is
@@ -39,29 +33,6 @@ void Narrow(std::u16string_view text, char* out) noexcept {
     const std::size_t length = text.size();
     for (std::size_t i = 0; i < length; ++i)
         out[i] = static_cast<char>(std::min<char16_t>(in[i], u'\x7f'));
-}
-
-// The rare forms (hexadecimal, infinities, NaNs, results out of range) go to the C library's
-// own parser in the C locale, which is the reference these rules follow.
-double ParseDoubleSlow(const char* first, const char* last) noexcept {
-    static const locale_t cLocale = newlocale(LC_ALL_MASK, "C", static_cast<locale_t>(0));
-    char small[64];
-    std::string large;
-    const std::size_t length = static_cast<std::size_t>(last - first);
-    const char* text;
-    if (length < sizeof small) {
-        std::memcpy(small, first, length);
-        small[length] = '\0';
-        text = small;
-    } else {
-        try {
-            large.assign(first, last);
-        } catch (...) {
-            return 0.0;  // no memory for a copy of an absurd token: read it as no number
-        }
-        text = large.c_str();
-    }
-    return cLocale ? strtod_l(text, nullptr, cLocale) : strtod(text, nullptr);
 }
 
 void CheckArray(const VARIANT& array) {
@@ -187,24 +158,10 @@ void AppendInt(TextBuilder<Char>& out, long long value) {
     out.AppendAscii(buffer, result.ptr);
 }
 
-// "%.15g" leaves the '.' out of numbers such as 1e-005 or 100000000000000, and the reader takes
-// a token without '.' for an integer: 1e-005 would come back as 1, 1e+015 as 1 and 1e14 as
-// 2147483647. A ".0" in front of the exponent (or at the end) keeps such a double a double.
-// Whole numbers within the integer range read back as the same number and keep their text.
-char* KeepReadableAsDouble(char* first, char* last, double value) {
-    if (std::find(first, last, '.') != last || !std::isfinite(value)) return last;
-    char* exponent = std::find(first, last, 'e');
-    if (exponent == last && value >= -2147483648.0 && value <= 2147483647.0) return last;
-    std::memmove(exponent + 2, exponent, static_cast<std::size_t>(last - exponent));
-    exponent[0] = '.';
-    exponent[1] = '0';
-    return last + 2;
-}
-
 template <class Char>
 void AppendDouble(TextBuilder<Char>& out, double value) {
-    char buffer[kDoubleTextCapacity + 2];
-    out.AppendAscii(buffer, KeepReadableAsDouble(buffer, FormatDouble(value, buffer), value));
+    char buffer[kDoubleTextCapacity];
+    out.AppendAscii(buffer, WriteDouble(value, buffer));
 }
 
 // The platform's text of a value; the empty text when it has none.
@@ -333,7 +290,7 @@ namespace {
 // placeholder of a narrowed unit does: a character is never part of a number, whatever the
 // number of bytes it takes.
 void FillNarrow(const char* const base, const std::size_t length, NumberTyping typing,
-                VARIANT& array, ULONG count);
+                VARIANT& array, ULONG count, ReadWarningScope* warnings);
 
 }  // namespace
 
@@ -354,39 +311,74 @@ void FillNumbers(std::u16string_view text, NumberTyping typing, VARIANT& array) 
         narrow = large.get();
     }
     Narrow(text, narrow);
-    FillNarrow(narrow, length, typing, array, count);
+    FillNarrow(narrow, length, typing, array, count, nullptr);
 }
 
 void FillNumbersUtf8(std::string_view utf8, NumberTyping typing, VARIANT& array) {
     CheckArray(array);
     const ULONG count = array.parray->rgsabound[0].cElements;
     if (count == 0) return;
-    FillNarrow(utf8.data(), utf8.size(), typing, array, count);
+    FillNarrow(utf8.data(), utf8.size(), typing, array, count, ReadWarningScope::Current());
 }
 
 namespace {
 
+// True when a token of the text names an infinity or a NaN: under whole-text typing such a
+// token makes the text one of doubles, as a '.' does, so that the written forms "inf" and "nan"
+// read back.
+bool AnyTokenNamesNonFinite(const char* base, std::size_t length) noexcept {
+    if (!std::memchr(base, 'n', length) && !std::memchr(base, 'N', length)) return false;
+    std::size_t start = 0;
+    for (std::size_t i = 0; i <= length; ++i) {
+        if (i < length && (base[i] != ' ' || i == 0)) continue;
+        if (NamesNonFinite(base + start, base + i)) return true;
+        start = i + 1;
+    }
+    return false;
+}
+
+void Warn(ReadWarningScope& warnings, const char* first, const char* last, const TokenRead& read) {
+    const char* kind = nullptr;
+    if (read.overflow)
+        kind = "overflow";
+    else if (std::all_of(first, last, [](char c) { return c == ' ' || (c >= '\t' && c <= '\r'); }))
+        kind = "empty";
+    else if (!read.whole)
+        kind = "partial";
+    if (!kind) return;
+    char text[kDoubleTextCapacity];
+    const char* end = read.isDouble ? WriteDouble(read.number, text)
+                                    : std::to_chars(text, text + sizeof text, read.integer).ptr;
+    warnings.Add(first, last, std::string_view(text, static_cast<std::size_t>(end - text)), kind);
+}
+
 void FillNarrow(const char* const base, const std::size_t length, NumberTyping typing,
-                VARIANT& array, ULONG count) {
+                VARIANT& array, ULONG count, ReadWarningScope* warnings) {
     ArrayData data(array.parray);
     VARIANT* const elements = data.get();
     const bool wholeTextDouble =
-        typing == NumberTyping::kWholeText && length != 0 && std::memchr(base, '.', length);
+        typing == NumberTyping::kWholeText && length != 0 &&
+        (std::memchr(base, '.', length) || AnyTokenNamesNonFinite(base, length));
 
     ULONG k = 0;
     auto store = [&](std::size_t begin, std::size_t end) {
         VARIANT& element = elements[k];
         if (element.vt != VT_EMPTY) VariantClear(&element);
+        const char* const first = base + begin;
+        const char* const last = base + end;
         bool asDouble = wholeTextDouble;
         if (typing == NumberTyping::kPerToken)
-            asDouble = k == 0 || (end > begin && std::memchr(base + begin, '.', end - begin));
-        if (asDouble) {
+            asDouble = k == 0 || (end > begin && std::memchr(first, '.', end - begin)) ||
+                       NamesNonFinite(first, last);
+        const TokenRead read = asDouble ? ReadDoubleToken(first, last) : ReadIntToken(first, last);
+        if (read.isDouble) {
             element.vt = VT_R8;
-            element.dblVal = ParseDouble(base + begin, base + end);
+            element.dblVal = read.number;
         } else {
             element.vt = VT_I4;
-            element.lVal = ParseInt(base + begin, base + end);
+            element.lVal = read.integer;
         }
+        if (warnings && (!read.whole || read.overflow)) Warn(*warnings, first, last, read);
         ++k;
     };
 
@@ -487,257 +479,6 @@ void FormatValueListUtf8(const VARIANT& stored, ElementWriting writing, bool quo
     TextBuilder<char> out;
     BuildValueList(out, stored, writing, quoteStrings);
     consume(std::string_view(out.data(), out.size()));
-}
-
-int ParseInt(const char* first, const char* last) noexcept {
-    while (first != last && IsCSpace(*first)) ++first;
-    bool negative = false;
-    if (first != last && (*first == '+' || *first == '-')) {
-        negative = *first == '-';
-        ++first;
-    }
-    // Stop growing just past the 32-bit range; the digits that follow only saturate further.
-    constexpr long long kLimit = static_cast<long long>(INT_MAX) + 2;
-    long long value = 0;
-    for (; first != last && IsDigit(*first); ++first) {
-        if (value < kLimit) value = value * 10 + (*first - '0');
-    }
-    if (negative) value = -value;
-    if (value > INT_MAX) return INT_MAX;
-    if (value < INT_MIN) return INT_MIN;
-    return static_cast<int>(value);
-}
-
-double ParseDouble(const char* first, const char* last) noexcept {
-    while (first != last && IsCSpace(*first)) ++first;
-    if (first == last) return 0.0;
-    const char* p = first;
-    bool negative = false;
-    if (*p == '+' || *p == '-') {
-        negative = *p == '-';
-        ++p;
-    }
-    if (p == last) return 0.0;
-    if (IsDigit(*p) || *p == '.') {
-        const bool hex = *p == '0' && last - p > 1 && LowerAscii(p[1]) == 'x';
-        if (!hex) {
-            double value = 0.0;
-            const std::from_chars_result result =
-                std::from_chars(p, last, value, std::chars_format::general);
-            if (result.ec == std::errc()) return negative ? -value : value;
-            if (result.ec == std::errc::invalid_argument) return 0.0;
-            // Out of range: the C library decides between infinity, zero and a subnormal.
-        }
-        return ParseDoubleSlow(first, last);
-    }
-    const char c = LowerAscii(*p);
-    if (c == 'i' || c == 'n') return ParseDoubleSlow(first, last);
-    return 0.0;
-}
-
-namespace {
-
-// The exponent is written with at least three digits, as the files have always had it.
-char* WidenExponent(char* buffer, char* end) noexcept {
-    char* e = static_cast<char*>(std::memchr(buffer, 'e', static_cast<std::size_t>(end - buffer)));
-    if (!e) return end;
-    char* digits = e + 2;  // past the exponent's sign
-    const std::ptrdiff_t count = end - digits;
-    if (count >= 3) return end;
-    const std::ptrdiff_t shift = 3 - count;
-    std::memmove(digits + shift, digits, static_cast<std::size_t>(count));
-    std::memset(digits, '0', static_cast<std::size_t>(shift));
-    return end + shift;
-}
-
-// The C library's own rounding at fifteen digits: exact, but several times slower than the
-// shortest form, so kept for the values where the shortest digits cannot decide.
-char* FormatDoubleExact(double value, char* buffer) noexcept {
-    char* end =
-        std::to_chars(buffer, buffer + kDoubleTextCapacity, value, std::chars_format::general, 15)
-            .ptr;
-    return WidenExponent(buffer, end);
-}
-
-constexpr int kPrecision = 15;
-
-// Powers of ten that doubles hold exactly.
-constexpr double kExactPowersOfTen[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,  1e7,
-                                        1e8,  1e9,  1e10, 1e11, 1e12, 1e13, 1e14, 1e15,
-                                        1e16, 1e17, 1e18, 1e19, 1e20, 1e21, 1e22};
-constexpr int kLargestExactPower = 22;
-
-constexpr char kDigitPairs[] =
-    "00010203040506070809101112131415161718192021222324252627282930313233343536373839"
-    "40414243444546474849505152535455565758596061626364656667686970717273747576777879"
-    "8081828384858687888990919293949596979899";
-
-// "%g" layout of the significant digits d0.d1d2... times 10^exponent: positional when
-// -4 <= exponent < 15, else with an exponent of three digits or more. `count` excludes
-// trailing zeros.
-char* WriteGeneral(char* out, bool negative, const char* digits, int count, int exponent) noexcept {
-    if (negative) *out++ = '-';
-    if (exponent < -4 || exponent >= kPrecision) {
-        *out++ = digits[0];
-        if (count > 1) {
-            *out++ = '.';
-            std::memcpy(out, digits + 1, static_cast<std::size_t>(count - 1));
-            out += count - 1;
-        }
-        *out++ = 'e';
-        *out++ = exponent < 0 ? '-' : '+';
-        const int e = exponent < 0 ? -exponent : exponent;
-        *out++ = static_cast<char>('0' + e / 100);
-        *out++ = static_cast<char>('0' + e / 10 % 10);
-        *out++ = static_cast<char>('0' + e % 10);
-    } else if (exponent >= 0) {
-        const int whole = exponent + 1;  // digits before the point
-        if (count <= whole) {
-            std::memcpy(out, digits, static_cast<std::size_t>(count));
-            out += count;
-            std::memset(out, '0', static_cast<std::size_t>(whole - count));
-            out += whole - count;
-        } else {
-            std::memcpy(out, digits, static_cast<std::size_t>(whole));
-            out += whole;
-            *out++ = '.';
-            std::memcpy(out, digits + whole, static_cast<std::size_t>(count - whole));
-            out += count - whole;
-        }
-    } else {
-        *out++ = '0';
-        *out++ = '.';
-        const int zeros = -exponent - 1;
-        std::memset(out, '0', static_cast<std::size_t>(zeros));
-        out += zeros;
-        std::memcpy(out, digits, static_cast<std::size_t>(count));
-        out += count;
-    }
-    return out;
-}
-
-// For a normal double the distance to its neighbours is below a unit in the fifteenth digit,
-// so at most one fifteen-digit decimal reads back as the double, and when one does it is the
-// correctly rounded fifteen-digit form: that is what printf writes.
-//
-// The quick way to find it: scale by an exact power of ten, round to an integer and check
-// that the integer, scaled back (one correctly rounded operation), gives the value again.
-// Values read from texts of up to fifteen digits, which is what files hold, all pass.
-bool FormatScaled(double magnitude, bool negative, char*& out) noexcept {
-    // The decimal exponent, from the binary one: floor(log10(2^e)) or one more.
-    std::uint64_t bits;
-    std::memcpy(&bits, &magnitude, sizeof bits);
-    const int binaryExponent = static_cast<int>(bits >> 52) - 1023;  // normal: 2^e <= magnitude
-    int exponent = (binaryExponent * 78913) >> 18;                   // floor(e * log10(2))
-    const int scale = kPrecision - 1 - exponent;  // makes fifteen digits before the point
-    if (scale < -kLargestExactPower + 1 || scale > kLargestExactPower) return false;
-    double scaled =
-        scale >= 0 ? magnitude * kExactPowersOfTen[scale] : magnitude / kExactPowersOfTen[-scale];
-    int usedScale = scale;
-    // The estimate is one too small when the value reaches the next power of ten (or rounds
-    // to it). The scaling is not exact; a wrong guess only fails the check below.
-    if (scaled >= 1e15 - 0.5) {
-        ++exponent;
-        --usedScale;
-        if (usedScale < -kLargestExactPower) return false;
-        scaled = usedScale >= 0 ? magnitude * kExactPowersOfTen[usedScale]
-                                : magnitude / kExactPowersOfTen[-usedScale];
-    }
-    std::uint64_t integer = static_cast<std::uint64_t>(scaled + 0.5);
-    const double back = usedScale >= 0
-                            ? static_cast<double>(integer) / kExactPowersOfTen[usedScale]
-                            : static_cast<double>(integer) * kExactPowersOfTen[-usedScale];
-    if (back != magnitude) return false;
-    if (integer >= 1000000000000000ull) {  // rounded up into the next decade: 10^15
-        integer /= 10;
-        ++exponent;
-    }
-    if (integer < 100000000000000ull) return false;  // not fifteen digits: leave it to the slow way
-    char digits[kPrecision + 1];
-    // Two digits at a time from two halves that fit 32 bits.
-    std::uint32_t high = static_cast<std::uint32_t>(integer / 100000000u);  // 7 digits
-    std::uint32_t low = static_cast<std::uint32_t>(integer % 100000000u);   // 8 digits
-    for (int i = kPrecision - 1; i > 7; i -= 2) {
-        std::memcpy(digits + i - 1, kDigitPairs + 2 * (low % 100), 2);
-        low /= 100;
-    }
-    for (int i = 6; i > 0; i -= 2) {
-        std::memcpy(digits + i - 1, kDigitPairs + 2 * (high % 100), 2);
-        high /= 100;
-    }
-    digits[0] = static_cast<char>('0' + high);
-    int count = kPrecision;
-    while (count > 1 && digits[count - 1] == '0') --count;
-    out = WriteGeneral(out, negative, digits, count, exponent);
-    return true;
-}
-
-}  // namespace
-
-char* FormatDouble(double value, char* buffer) noexcept {
-    const double magnitude = std::fabs(value);
-    if (magnitude < 1e15 && value == std::trunc(value) && !(value == 0.0 && std::signbit(value))) {
-        // Whole numbers below 10^15 (axis points, counts) are written by "%.15g" as the plain
-        // integer.
-        return std::to_chars(buffer, buffer + kDoubleTextCapacity, static_cast<long long>(value))
-            .ptr;
-    }
-    // Infinities, NaNs and subnormals: a subnormal's neighbours are so far apart, relative to
-    // its size, that its shortest digits say nothing about its fifteenth digit.
-    if (!(magnitude >= DBL_MIN && magnitude <= DBL_MAX)) {
-        if (value == 0.0) {  // negative zero
-            std::memcpy(buffer, "-0", 2);
-            return buffer + 2;
-        }
-        return FormatDoubleExact(value, buffer);
-    }
-    const bool negative = std::signbit(value);
-    char* out = buffer;
-    if (FormatScaled(magnitude, negative, out)) return out;
-
-    // Otherwise from the shortest digits that read back as the value (the closest such when
-    // several are). With at most fifteen of them they are the fifteen-digit form (above).
-    // With sixteen or seventeen, rounding the digit string gives the rounding of the exact
-    // value unless the tail is exactly "5": a fifteen-digit rounding boundary strictly
-    // between the value and its shortest digits would itself read back as the value while
-    // being shorter, or as short and closer.
-    char shortest[kDoubleTextCapacity];
-    const char* const shortestEnd = std::to_chars(shortest, shortest + sizeof shortest, magnitude,
-                                                  std::chars_format::scientific)
-                                        .ptr;
-    // Form: d[.ddd]e(+|-)dd[d]
-    const char* p = shortest;
-    char digits[20];
-    int count = 0;
-    digits[count++] = *p++;
-    if (*p == '.') {
-        ++p;
-        while (*p != 'e') digits[count++] = *p++;
-    }
-    ++p;  // 'e'
-    const bool negativeExponent = *p++ == '-';
-    int exponent = 0;
-    for (; p != shortestEnd; ++p) exponent = exponent * 10 + (*p - '0');
-    if (negativeExponent) exponent = -exponent;
-
-    if (count > kPrecision) {
-        if (count == kPrecision + 1 && digits[kPrecision] == '5')
-            return FormatDoubleExact(value, buffer);  // a tie in the digits; the binary decides
-        const bool up = digits[kPrecision] >= '5';
-        count = kPrecision;
-        if (up) {
-            int i = kPrecision - 1;
-            while (i >= 0 && digits[i] == '9') digits[i--] = '0';
-            if (i >= 0) {
-                ++digits[i];
-            } else {  // 9.99...9 became 10.00...0
-                digits[0] = '1';
-                ++exponent;
-            }
-        }
-    }
-    while (count > 1 && digits[count - 1] == '0') --count;
-    return WriteGeneral(buffer, negative, digits, count, exponent);
 }
 
 }  // namespace detail

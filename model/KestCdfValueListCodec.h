@@ -12,6 +12,7 @@
 
 #include "../platform/Automation.h"
 #include "../text/KestCdfNormalizedString.h"
+#include "detail/NumberText.h"
 
 namespace kest {
 namespace detail {
@@ -128,23 +129,6 @@ _variant_t FormatValueList(const VARIANT& stored, ElementWriting writing, bool q
 /// text as UTF-8. Throws _com_error when memory runs out.
 void FormatValueListUtf8(const VARIANT& stored, ElementWriting writing, bool quoteStrings,
                          const std::function<void(std::string_view)>& consume);
-
-/// atoi in the C locale over [first, last): white space skipped, optional sign, decimal
-/// digits, stopping at the first other character; 0 when there is no number. Values outside
-/// the 32-bit range saturate at INT_MIN and INT_MAX.
-int ParseInt(const char* first, const char* last) noexcept;
-
-/// atof (strtod) in the C locale over [first, last): white space skipped, then a decimal or
-/// hexadecimal floating-point number, "inf", "infinity", "nan" or "nan(...)" in any case,
-/// stopping at the first character that does not fit; 0 when there is no number.
-double ParseDouble(const char* first, const char* last) noexcept;
-
-/// Room needed by FormatDouble.
-constexpr std::size_t kDoubleTextCapacity = 32;
-/// Writes printf "%.15g" of `value` in the C locale with an exponent of at least three digits
-/// (1e+020, 1e-005); infinities and NaNs as printf writes them ("inf", "-inf", "nan",
-/// "-nan"). `buffer` must hold kDoubleTextCapacity characters; returns the end of the text.
-char* FormatDouble(double value, char* buffer) noexcept;
 
 }  // namespace detail
 }  // namespace kest

@@ -42,17 +42,20 @@ class IXMLDOMDocument : public IXMLDOMNode {
     IXMLDOMProcessingInstructionPtr createProcessingInstruction(const _bstr_t& target,
                                                                 const _bstr_t& data);
 
-    /// Loads a file path or (with "ServerHTTPRequest" true) an http/https URL, replacing the
-    /// content. Never throws for a bad source: returns VARIANT_FALSE and fills the parse error.
+    /// Loads a file path ("-" for standard input; pipes are read once) or (with
+    /// "ServerHTTPRequest" true) an http/https URL, replacing the content. Never throws for a bad
+    /// source: returns VARIANT_FALSE and fills the parse error.
     VARIANT_BOOL load(const _variant_t& source);
     /// Loads XML text given as a string.
     VARIANT_BOOL loadXML(const _bstr_t& text);
     /// Loads XML from bytes in memory (encoding detected from BOM or declaration).
     VARIANT_BOOL loadBuffer(const void* data, std::size_t size);
     /// Writes the document as UTF-8 to a file path, atomically: a temporary file in the target
-    /// directory is renamed on success. On failure throws _com_error and leaves any earlier
-    /// file untouched. The declaration is written from the document's "xml" processing
-    /// instruction, its encoding always "UTF-8"; a document without one is written without.
+    /// directory, named after the writing process, is synced and renamed on success, and the
+    /// directory synced; temporaries of ended processes are removed by the next save. On failure
+    /// throws _com_error and leaves any earlier file untouched. The declaration is written from the
+    /// document's "xml" processing instruction, its encoding always "UTF-8"; a document without one
+    /// is written without.
     void save(const _variant_t& destination);
     /// The result of the last load or validation.
     IXMLDOMParseErrorPtr GetparseError() const;
@@ -80,9 +83,14 @@ class IXMLDOMDocument : public IXMLDOMNode {
 class IXMLDOMDocument2 : public IXMLDOMDocument {
   public:
     /// Properties: "ServerHTTPRequest" (bool: allow http/https sources and schema locations),
-    /// "MaxElementDepth" (integer, 0 for the default), "Indent" (bool, off in a new document:
-    /// save puts each child of an element holding only elements on a line of its own, two
-    /// spaces per level; an extension of ours). Other names: E_INVALIDARG.
+    /// "MaxElementDepth" (integer, 0 for the default). Extensions: "SchemaPath" (string: a
+    /// schema path or URL to validate against instead of those the root names),
+    /// "BuiltinSchemaFallback" (bool: a root naming one missing local schema in the CDF
+    /// namespace, or an http one without ServerHTTPRequest, is validated against the library's
+    /// built-in cdf.xsd) and, to read only, "UsedBuiltinSchema" (the last load or validation
+    /// did so), "Indent" (bool, off in a new document: save puts each child of an
+    /// element holding only elements on a line of its own, two spaces per level). Other names:
+    /// E_INVALIDARG.
     void setProperty(const _bstr_t& name, const _variant_t& value);
     _variant_t getProperty(const _bstr_t& name) const;
     /// Attaches a schema collection used by validate(); an empty pointer detaches it.

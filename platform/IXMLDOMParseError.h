@@ -5,6 +5,13 @@
 
 namespace kest {
 
+/// Extension: the kind of failure, where something can be done about it.
+enum DomFailureCause : long {
+    DOM_CAUSE_OTHER = 0,
+    DOM_CAUSE_UNKNOWN_ENCODING = 1,    ///< the document's encoding is not one the parser reads
+    DOM_CAUSE_SCHEMA_UNAVAILABLE = 2,  ///< the named schema file is missing, or http while offline
+};
+
 class IXMLDOMParseError : public RefCounted {
   public:
     /// 0 on success; otherwise a failure code (XML_E_PARSEFAILED, XML_E_INVALID,
@@ -21,6 +28,10 @@ class IXMLDOMParseError : public RefCounted {
     virtual long Getfilepos() = 0;
     /// The text of the failing line, as far as known.
     virtual _bstr_t GetsrcText() = 0;
+    /// Extension: what is wrong without where, element names as written in the document.
+    virtual _bstr_t GetreasonText() = 0;
+    /// Extension: a DomFailureCause.
+    virtual long Getcause() = 0;
 };
 
 }  // namespace kest

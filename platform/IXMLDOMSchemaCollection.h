@@ -17,6 +17,9 @@ class IXMLDOMSchemaCollection : public RefCounted {
     virtual _bstr_t GetnamespaceURI(long index) = 0;
     /// Removes the schema of that namespace, if any.
     virtual void remove(const _bstr_t& namespaceURI) = 0;
+    /// Extension: whether add() may fetch http(s) schemas and includes (true in a new
+    /// collection), as the "ServerHTTPRequest" property does for a document.
+    virtual void PutserverHttpRequest(bool allow) = 0;
 
     /// Creates an empty collection for ProgID "Msxml2.XMLSchemaCache.4.0"; the caller owns the
     /// returned reference count of zero through ComPtr. Other names give REGDB_E_CLASSNOTREG.

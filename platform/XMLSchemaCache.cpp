@@ -31,7 +31,7 @@ class XMLSchemaCollection final : public IXMLDOMSchemaCollection {
         // Relative paths are taken against the current directory.
         if (!ResolveSchemaLocation(written, std::string(), resolved, error))
             throw _com_error(E_FAIL, error);
-        SchemaLoad load = LoadSchema(resolved, /*allowHttp=*/true);
+        SchemaLoad load = LoadSchema(resolved, m_allowHttp);
         if (!load.schema) throw _com_error(E_FAIL, load.failure.reason);
         std::string target = SchemaTargetNamespace(*load.schema);
         if (target != ns) {
@@ -73,6 +73,8 @@ class XMLSchemaCollection final : public IXMLDOMSchemaCollection {
         }
     }
 
+    void PutserverHttpRequest(bool allow) override { m_allowHttp = allow; }
+
     std::vector<Entry> Snapshot() const {
         std::lock_guard<std::mutex> lock(m_mutex);
         return m_entries;
@@ -81,6 +83,7 @@ class XMLSchemaCollection final : public IXMLDOMSchemaCollection {
   private:
     mutable std::mutex m_mutex;
     std::vector<Entry> m_entries;
+    bool m_allowHttp = true;
 };
 
 bool EqualsIgnoringAsciiCase(const OLECHAR* left, const OLECHAR* right) noexcept {

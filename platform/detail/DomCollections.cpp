@@ -133,6 +133,10 @@ class ParseError final : public IXMLDOMParseError {
     long Getlinepos() override { return m_error.linepos; }
     long Getfilepos() override { return m_error.filepos; }
     _bstr_t GetsrcText() override { return _bstr_t(m_error.srcText); }
+    _bstr_t GetreasonText() override {
+        return _bstr_t(m_error.what.empty() ? m_error.reason : m_error.what);
+    }
+    long Getcause() override { return m_error.cause; }
 
   private:
     DomError m_error;

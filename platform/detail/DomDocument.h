@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "../IXMLDOMNode.h"
+#include "../IXMLDOMParseError.h"
 #include "../IXMLDOMSchemaCollection.h"
 
 namespace kest {
@@ -131,6 +132,8 @@ struct DomError {
     long linepos = 0;
     long filepos = 0;
     std::string srcText;
+    std::string what;  // the reason without the position, when the reason carries one
+    long cause = DOM_CAUSE_OTHER;
 };
 
 /// Memory of one generation of content: nodes, strings and the names they use.
@@ -167,6 +170,9 @@ struct DomDocument {
     bool validateOnParse = true;
     bool preserveWhiteSpace = true;
     bool serverHttpRequest = false;
+    std::string schemaPath;              // "SchemaPath": validate against this schema instead
+    bool builtinSchemaFallback = false;  // "BuiltinSchemaFallback"
+    bool usedBuiltinSchema = false;      // "UsedBuiltinSchema": the last load or validation did
     long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
     bool indent = false;       // save writes one element per line
     ComPtr<IXMLDOMSchemaCollection> schemas;

@@ -31,6 +31,7 @@ struct Builder {
     bool utf8Bom = false;   // the bytes start with a UTF-8 byte order mark (encoding not forced)
     bool rootOnly = false;  // stop once the root element's start tag is built
     bool rootSeen = false;
+    bool hasDoctype = false;
     bool dropBlanksBesideElements = false;
     std::string text;  // character data not yet turned into a node
     // Names repeat throughout a document: a small direct-mapped cache in front of the store's
@@ -238,6 +239,30 @@ void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* enco
 
 void XMLCALL OnDoctypeStart(void* data, const XML_Char*, const XML_Char*, const XML_Char*, int) {
     static_cast<Builder*>(data)->doctypeDepth++;
+    static_cast<Builder*>(data)->hasDoctype = true;
+}
+
+// Entities are never read from outside the bytes: a reference to one would silently lose text.
+void XMLCALL OnSkippedEntity(void* data, const XML_Char* name, int parameterEntity) {
+    if (parameterEntity) return;  // inside the DTD; changes no content
+    Guard(data, [&](Builder& b) {
+        b.Stop(std::string("reference to entity '") + name +
+               "', which is not declared in the document and is never loaded");
+    });
+}
+
+int XMLCALL OnExternalEntity(XML_Parser parser, const XML_Char* context, const XML_Char*,
+                             const XML_Char* systemId, const XML_Char*) {
+    // The context ends with the name of the entity being opened.
+    std::string name = context ? context : "";
+    std::string::size_type separator = name.rfind('\f');
+    if (separator != std::string::npos) name.erase(0, separator + 1);
+    void* data = XML_GetUserData(parser);
+    Guard(data, [&](Builder& b) {
+        b.Stop("reference to external entity '" + name + "' (" + (systemId ? systemId : "") +
+               "), which is never loaded");
+    });
+    return XML_STATUS_ERROR;
 }
 
 void XMLCALL OnDoctypeEnd(void* data) { static_cast<Builder*>(data)->doctypeDepth--; }
@@ -319,11 +344,15 @@ bool FileSource::Open(const std::string& path, DomError& error) {
         error.reason = std::string(what) + " " + path + ": " + std::strerror(err);
         return false;
     };
-    m_fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    // Our own descriptor for standard input, so that closing the source leaves the process's.
+    m_fd = path == "-" ? ::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 0)
+                       : ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
     if (m_fd < 0) return fail(errno, "cannot open");
     struct stat st {};
     if (::fstat(m_fd, &st) != 0) return fail(errno, "cannot read");
     if (S_ISDIR(st.st_mode)) return fail(EISDIR, "cannot load");
+    // A regular file that is standard input may have been read partly; it is still read once.
+    m_seekable = S_ISREG(st.st_mode) && path != "-";
     if (S_ISREG(st.st_mode)) m_size = static_cast<std::size_t>(st.st_size);
     return true;
 }
@@ -350,7 +379,7 @@ bool FileSource::Rewind() {
 }
 
 bool FileSource::ReadAll(std::string& bytes, std::string& error) {
-    if (!Rewind()) {
+    if (!m_atStart && !Rewind()) {
         error = "cannot read " + m_path + ": " + std::strerror(errno);
         return false;
     }
@@ -406,6 +435,8 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
         // No external entity handler is installed and parameter entities are never parsed:
         // nothing outside the given bytes is ever read.
         XML_SetParamEntityParsing(parser, XML_PARAM_ENTITY_PARSING_NEVER);
+        XML_SetSkippedEntityHandler(parser, OnSkippedEntity);
+        XML_SetExternalEntityRefHandler(parser, OnExternalEntity);
 
         XML_Status status = XML_STATUS_OK;
         bool first = true;
@@ -427,6 +458,7 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
             status = XML_Parse(parser, piece.data(), static_cast<int>(piece.size()), last);
             if (status != XML_STATUS_OK || last) break;
         }
+        result.hasDoctype = b.hasDoctype;
         if (b.rootSeen) {
             XML_ParserFree(parser);
             return result;
@@ -443,11 +475,14 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
             } else {
                 XML_Error code = XML_GetErrorCode(parser);
                 what = XML_ErrorString(code) ? XML_ErrorString(code) : "parse error";
+                if (code == XML_ERROR_UNKNOWN_ENCODING || code == XML_ERROR_INCORRECT_ENCODING)
+                    error.cause = DOM_CAUSE_UNKNOWN_ENCODING;
                 error.line = static_cast<long>(XML_GetCurrentLineNumber(parser));
                 error.linepos = static_cast<long>(XML_GetCurrentColumnNumber(parser)) + 1;
                 error.filepos = static_cast<long>(XML_GetCurrentByteIndex(parser));
             }
             error.reason = DescribeLocation(what, error.line, error.linepos, url);
+            error.what = what;
             error.srcText = source.LineAround(error.filepos);
             XML_ParserFree(parser);
             return ParsedContent();

@@ -15,6 +15,7 @@ namespace detail {
 struct ParsedContent {
     std::unique_ptr<DomStore> store;
     DomNode* top = nullptr;
+    bool hasDoctype = false;  // a document type declaration came before the root
 };
 
 /// Bytes to parse, delivered in pieces so that a file need not be held in memory whole.
@@ -44,8 +45,12 @@ class FileSource final : public XmlSource {
     ~FileSource() override;
     FileSource(const FileSource&) = delete;
     FileSource& operator=(const FileSource&) = delete;
-    /// Opens a file for reading; false with a reason naming the path and the cause.
+    /// Opens a file for reading ("-" reads standard input); false with a reason naming the path
+    /// and the cause.
     bool Open(const std::string& path, DomError& error);
+    /// True for a regular file, which can be read again from its start; false for pipes,
+    /// terminals and standard input, whose bytes can be read once only.
+    bool Seekable() const noexcept { return m_seekable; }
     bool Next(std::string_view& piece, std::string& error) override;
     std::string LineAround(long offset) override;
     /// Starts reading again from the first byte.
@@ -60,6 +65,7 @@ class FileSource final : public XmlSource {
     std::size_t m_size = 0;
     bool m_atStart = true;
     bool m_utf16 = false;
+    bool m_seekable = false;
 };
 
 /// The failure code for an errno value (E_ACCESSDENIED, file/path not found, E_FAIL).
@@ -70,6 +76,8 @@ HRESULT HResultForErrno(int err) noexcept;
 /// With `rootOnly` parsing stops after the root element's start tag (for a look at its
 /// attributes). Without `preserveWhiteSpace`, text of white space alone that stands beside an
 /// element (indentation between elements) is dropped; white space in text-only content stays.
+/// A reference to an entity that is never read (external, or undeclared beside a DTD that is
+/// not read) fails the parse naming the entity, rather than vanishing from the text.
 /// Returns the content, or an empty store with `error` filled. Never throws.
 ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std::string& url,
                        long maxElementDepth, DomError& error, bool rootOnly = false,

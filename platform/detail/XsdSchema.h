@@ -7,6 +7,8 @@
 #include <string_view>
 #include <vector>
 
+#include "HttpClient.h"
+#include "SchemaUri.h"
 #include "SchemaValidation.h"
 
 namespace kest {
@@ -22,12 +24,6 @@ struct SchemaLoad {
     ValidationOutcome failure;
 };
 
-/// Turns a schema location into an absolute path or an http(s) URL: relative locations are
-/// taken against the directory of `baseUrl` (a path or an http(s) URL), file: URLs become
-/// paths. Returns false, with the reason in `error`, for an empty location or another scheme.
-bool ResolveSchemaLocation(const std::string& location, const std::string& baseUrl,
-                           std::string& resolved, std::string& error);
-
 /// Compiles the schema at a resolved location, or takes it from the process-wide cache (local
 /// files by path, modification time and size; http(s) URLs for the process lifetime). An http
 /// location, or an http include inside a schema, fails unless `allowHttp`.
@@ -37,6 +33,12 @@ SchemaLoad LoadSchema(const std::string& resolvedLocation, bool allowHttp);
 /// that name several schemas; cached like LoadSchema.
 SchemaLoad LoadCombinedSchema(const std::vector<SchemaRef>& resolvedRefs, bool allowHttp);
 
+/// Compiles a schema from text (not cached); `name` stands for it in messages.
+SchemaLoad LoadSchemaText(const std::string& name, const std::string& text);
+
+/// The library's own copy of cdf.xsd, compiled once (empty if it does not compile).
+const CompiledSchemaHandle& BuiltinCdfSchema();
+
 /// The target namespace of a compiled schema ("" when it has none).
 std::string SchemaTargetNamespace(const CompiledSchema& schema);
 
@@ -44,6 +46,11 @@ std::string SchemaTargetNamespace(const CompiledSchema& schema);
 /// entity is read while the document is parsed.
 ValidationOutcome ValidateWithSchema(const CompiledSchema& schema, std::string_view document,
                                      const std::string& documentUrl);
+
+/// The limits of every http(s) fetch of a schema document (process-wide; 30 s, 64 MB and 5
+/// redirects unless changed). The bytes limit also bounds one schema with all its includes.
+HttpLimits SchemaFetchLimits();
+void SetSchemaFetchLimits(const HttpLimits& limits);
 
 }  // namespace detail
 }  // namespace kest

@@ -69,12 +69,12 @@ TEST(KestCdfCalItemValue, StoresTextByFormatTypeAndOriginAndWritesItBack) {
         {true, u"NUMERIC", u"7", {R8(7)}, u"7"},
         {true, u"NUMERIC", u"1e5 2", {R8(1e5), I4(2)}, u"100000 2"},
         {true, u"NUMERIC", u"2 1e5 3.5e-7", {R8(2), I4(1), R8(3.5e-7)}, u"2 1 3.5e-007"},
-        {true, u"NUMERIC", u"1e20 -9999999999", {R8(1e20), I4(INT_MIN)}, u"1.0e+020 -2147483648"},
+        {true, u"NUMERIC", u"1e20 -9999999999", {R8(1e20), R8(-9999999999.0)}, u"1.0e+020 -9999999999.0"},
         {true,
          u"NUMERIC",
          u"0.1 x 0.30000000000000004",
          {R8(0.1), I4(0), R8(0.30000000000000004)},
-         u"0.1 0 0.3"},
+         u"0.1 0 0.30000000000000004"},
         {true, u"NUMERIC", u"1.5 2,5", {R8(1.5), I4(2)}, u"1.5 2"},
         {true, u"STRING", u"\"a b\" \"c\"", {Str(u"a b"), Str(u"c")}, u"\"a b\" \"c\""},
         {true, u"STRING", u"\"\"", {Str(u"")}, u"\"\""},
@@ -292,7 +292,8 @@ TEST(KestCdfCalItemValue, LongAndOverflowingTokens) {
     KestCdfCalItemValue value = MakeValue(true, u"NUMERIC");
     value.SetValue(_variant_t(u"0." + std::u16string(300, u'0') + u"5 " + digits + u" -" + digits +
                               u" 0" + digits + u".0"));
-    ExpectElements(value.GetValue(), {R8(5e-301), I4(INT_MAX), I4(INT_MIN),
+    ExpectElements(value.GetValue(), {R8(5e-301), R8(std::numeric_limits<double>::infinity()),
+                                      R8(-std::numeric_limits<double>::infinity()),
                                       R8(std::numeric_limits<double>::infinity())});
 }
 

@@ -32,8 +32,10 @@ TEST(KestCdfSymbolicFile, AtohdReadsHexadecimalOnlyWithLowercaseX) {
         {"0X1A", 0},
         {"  -42", -42},
         {"", 0},
-        {"2147483648", INT_MAX},
-        {"-2147483649", INT_MIN},
+        {"2147483648", INT_MIN},  // decimal over the whole unsigned range
+        {"4294967295", -1},
+        {"4294967296", -1},
+        {"-2147483649", INT_MAX},
         {nullptr, 0},
     };
     for (const auto& row : rows) {

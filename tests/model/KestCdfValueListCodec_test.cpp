@@ -412,7 +412,8 @@ TEST(KestCdfValueListCodec, TokensOfAnyLengthParseByTheirLeadingCharacters) {
     ASSERT_EQ(3u, elements.size());
     EXPECT_EQ(VT_I4, elements[0].vt);
     EXPECT_EQ(7, elements[0].lVal);
-    EXPECT_EQ(INT_MAX, elements[1].lVal);
+    EXPECT_EQ(VT_R8, elements[1].vt);  // beyond 32 bits: kept as a double
+    EXPECT_EQ(1e300, elements[1].dblVal);
     EXPECT_EQ(5, elements[2].lVal);
 
     _variant_t doubles = NewValueArray(2);
@@ -491,7 +492,7 @@ TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
 
     _variant_t axis = FormatValueList(array, ElementWriting::kAxis, false);
     ASSERT_EQ(VT_BSTR, axis.vt);
-    EXPECT_EQ(u"1.0e+020 0.100000001490116 -42 a b 0 7 -1", std::u16string(BstrView(axis.bstrVal)));
+    EXPECT_EQ(u"1.0e+020 0.10000000149011612 -42 a b 0 7 -1", std::u16string(BstrView(axis.bstrVal)));
     _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue, false);
     EXPECT_EQ(u"1.0e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
 }
@@ -514,7 +515,9 @@ TEST(KestCdfValueListCodec, LongListsAreWrittenAndReadWhole) {
             numbers.push_back(-i);
         } else {
             data[i].vt = VT_R8;
-            data[i].dblVal = (i + 0.25) * (100.0 / 255) * (i % 3 ? 1e-9 : 1.0);
+            // Values whose "%.15g" text reads back, so that it is the text written.
+            data[i].dblVal =
+                ReferenceAtof(ReferenceFormat((i + 0.25) * (100.0 / 255) * (i % 3 ? 1e-9 : 1.0)));
             expected += ReferenceFormat(data[i].dblVal);
             numbers.push_back(ReferenceAtof(ReferenceFormat(data[i].dblVal)));
         }

@@ -1,0 +1,2 @@
+<?xml version="1.0"?>
+<CAL-DATA xmlns:xsi="http://www.w3.org/2001/XMLSchema-instance" xmlns="http://kest.dev/schemas/cdf/1.0" xsi:schemaLocation="http://kest.dev/schemas/cdf/1.0 cdf.xsd"><CHANGE-HISTORY/><FILENAME>f</FILENAME><CAL-LIST><NAME>L</NAME><SYMBOLIC-FILE crc32="0x00000007">s</SYMBOLIC-FILE><CAL-ITEM><NAME>V</NAME><VALUE sw-units-ref="" format-type="NUMERIC">98O 7,60  abc 0.30000000000000004</VALUE></CAL-ITEM></CAL-LIST></CAL-DATA>
