@@ -27,8 +27,8 @@
 #include "BenchSupport.h"
 #include "CdfGen.h"
 #include "core/KestCalmorph.h"
-#include "core/KestCalmorphDLLError.h"
 #include "model/KestCdfCalList.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 #ifndef KEST_BENCH_SCHEMA

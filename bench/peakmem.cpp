@@ -25,7 +25,7 @@
 
 #include "BenchSupport.h"
 #include "core/KestCalmorph.h"
-#include "core/KestCalmorphDLLError.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 using namespace kest;

@@ -6,8 +6,9 @@
 
 #include "../model/KestCdfCalData.h"
 #include "../platform/CComBSTR.h"
+#include "../platform/Export.h"
+#include "../platform/KestCalmorphDLLError.h"
 #include "../platform/XmlDom.h"
-#include "KestCalmorphDLLError.h"
 #include "KestLoadError.h"
 #include "KestReadOptions.h"
 #include "KestWriteOptions.h"
@@ -19,7 +20,7 @@ constexpr const OLECHAR* kCdfNamespaceURI = u"http://kest.dev/schemas/cdf/1.0";
 /// The conventional file name of the CDF schema.
 constexpr const char* kCdfSchemaFileName = "cdf.xsd";
 
-class KestCalmorph {
+class KEST_API KestCalmorph {
   public:
     KestCalmorph();
     KestCalmorph(const KestCalmorph& other);

@@ -7,7 +7,6 @@
 #include <cstring>
 #include <string>
 
-#include "../platform/detail/SchemaValidation.h"
 #include "KestCalmorph.h"
 
 namespace kest {
@@ -42,7 +41,7 @@ CComBSTR ParseErrorReason(const IXMLDOMDocument2Ptr& document) {
 bool KestCalmorph::IsMSXML4Installed() {
     bool usable = false;
     try {
-        if (detail::SchemaValidatorUsable()) {
+        if (IXMLDOMSchemaCollection::ValidatorUsable()) {
             IXMLDOMDocument2Ptr document;
             if (SUCCEEDED(document.CreateInstance(kProgIdDOMDocument40))) {
                 document->Putasync(VARIANT_FALSE);

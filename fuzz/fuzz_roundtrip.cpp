@@ -12,7 +12,7 @@
 #include <string>
 
 #include "core/KestCalmorph.h"
-#include "core/KestCalmorphDLLError.h"
+#include "platform/KestCalmorphDLLError.h"
 
 using namespace kest;
 

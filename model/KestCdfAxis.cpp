@@ -7,8 +7,8 @@
 #include <string_view>
 #include <utility>
 
-#include "../core/KestCalmorphDLLError.h"
-#include "KestCdfValueListCodec.h"
+#include "../platform/KestCalmorphDLLError.h"
+#include "detail/ValueListCodec.h"
 
 namespace kest {
 

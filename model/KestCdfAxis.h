@@ -5,12 +5,13 @@
 #include <string_view>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfAxis {
+class KEST_API KestCdfAxis {
   public:
     /// An empty axis: value VT_EMPTY, size 0, empty units and format type.
     KestCdfAxis();
@@ -62,7 +63,7 @@ class KestCdfAxis {
     void SetAxisAttributes(IXMLDOMNamedNodeMapPtr attributes);
     unsigned int GetNodeValue(IXMLDOMNodePtr node);
     _bstr_t GetNodeString(IXMLDOMNodePtr node);
-    // The value list codec with this class's rules (see KestCdfValueListCodec.h). The text
+    // The value list codec with this class's rules (see detail/ValueListCodec.h). The text
     // and values are passed by reference and the array by move: these run once per value of a
     // file, and copying a whole array per call would dominate.
     int CountValues(std::u16string_view text) const noexcept;

@@ -1,12 +1,12 @@
 #include "KestCdfCalData.h"
 
-#include "KestCdfDomWriting.h"
-#include "KestCdfValueListCodec.h"
+#include "detail/DomWriting.h"
+#include "detail/ValueListCodec.h"
 
 #include <string>
 #include <string_view>
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 

@@ -5,15 +5,16 @@
 #include <utility>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 #include "KestCdfCalList.h"
 #include "KestCdfChangeHistory.h"
-#include "KestCdfShared.h"
+#include "KestCdfSharedChild.h"
 
 namespace kest {
 
-class KestCdfCalData {
+class KEST_API KestCdfCalData {
   public:
     /// Empty strings, no lists (size 0), an empty change history.
     KestCdfCalData() = default;
@@ -95,7 +96,7 @@ class KestCdfCalData {
     KestCdfNormalizedString m_company;
     KestCdfNormalizedString m_fileName;
     CComBSTR m_note;
-    detail::SharedChild<KestCdfCalList> m_calLists;
+    KestCdfSharedChild<KestCdfCalList> m_calLists;
     KestCdfChangeHistory m_changeHistory;
     int m_calListSize = 0;
     // Working pointer of the write in progress; holds no reference and is stale afterwards.

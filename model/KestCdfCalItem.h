@@ -6,15 +6,16 @@
 #include <utility>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 #include "KestCdfAxis.h"
 #include "KestCdfCalItemValue.h"
-#include "KestCdfShared.h"
+#include "KestCdfSharedChild.h"
 
 namespace kest {
 
-class KestCdfCalItem {
+class KEST_API KestCdfCalItem {
   public:
     /// Null name, annotation and note; no value, no axes, axis size 0.
     KestCdfCalItem() = default;
@@ -80,8 +81,8 @@ class KestCdfCalItem {
     void WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc, const KestCdfNormalizedString& ns);
 
     KestCdfNormalizedString m_name;
-    detail::SharedChild<KestCdfAxis> m_axes;
-    detail::SharedChild<KestCdfCalItemValue> m_value;
+    KestCdfSharedChild<KestCdfAxis> m_axes;
+    KestCdfSharedChild<KestCdfCalItemValue> m_value;
     CComBSTR m_annotation;
     CComBSTR m_note;
     int m_axisSize = 0;

@@ -3,8 +3,8 @@
 #include <string_view>
 #include <utility>
 
-#include "../core/KestCalmorphDLLError.h"
-#include "KestCdfValueListCodec.h"
+#include "../platform/KestCalmorphDLLError.h"
+#include "detail/ValueListCodec.h"
 
 namespace kest {
 

@@ -5,12 +5,13 @@
 #include <string_view>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfCalItemValue {
+class KEST_API KestCdfCalItemValue {
   public:
     /// An empty value: VT_EMPTY, empty units and format type, not read from a document.
     KestCdfCalItemValue();
@@ -58,7 +59,7 @@ class KestCdfCalItemValue {
 
   private:
     _bstr_t GetNodeString(IXMLDOMNodePtr node);
-    // The value list codec with this class's rules (see KestCdfValueListCodec.h). The text
+    // The value list codec with this class's rules (see detail/ValueListCodec.h). The text
     // and values are passed by reference and the array by move: these run once per value of a
     // file, and copying a whole array per call would dominate.
     int CountValues(std::u16string_view text) const noexcept;

@@ -1,8 +1,8 @@
 #include "KestCdfCalList.h"
 
-#include "KestCdfDomWriting.h"
+#include "detail/DomWriting.h"
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 

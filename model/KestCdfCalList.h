@@ -5,16 +5,17 @@
 #include <utility>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 #include "KestCdfCalItem.h"
-#include "KestCdfShared.h"
+#include "KestCdfSharedChild.h"
 #include "KestCdfSymbolicFile.h"
 #include "KestCdfTargetImage.h"
 
 namespace kest {
 
-class KestCdfCalList {
+class KEST_API KestCdfCalList {
   public:
     /// Null name and note, no file references, no items, item size -1 (not set).
     KestCdfCalList() = default;
@@ -78,10 +79,10 @@ class KestCdfCalList {
     void ReadChild(IXMLDOMNodePtr child, int& itemIndex);
 
     KestCdfNormalizedString m_name;
-    detail::SharedChild<KestCdfSymbolicFile> m_symbolicFile;
-    detail::SharedChild<KestCdfTargetImage> m_targetImage;
+    KestCdfSharedChild<KestCdfSymbolicFile> m_symbolicFile;
+    KestCdfSharedChild<KestCdfTargetImage> m_targetImage;
     CComBSTR m_note;
-    detail::SharedChild<KestCdfCalItem> m_calItems;
+    KestCdfSharedChild<KestCdfCalItem> m_calItems;
     int m_calItemSize = -1;
 };
 

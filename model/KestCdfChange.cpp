@@ -1,6 +1,6 @@
 #include "KestCdfChange.h"
 
-#include "KestCdfDomWriting.h"
+#include "detail/DomWriting.h"
 
 namespace kest {
 

@@ -5,13 +5,14 @@
 #include <utility>
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfDate.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfChange {
+class KEST_API KestCdfChange {
   public:
     /// Empty strings (null) and the current local time as date.
     KestCdfChange() = default;

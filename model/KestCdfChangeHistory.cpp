@@ -1,6 +1,6 @@
 #include "KestCdfChangeHistory.h"
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 

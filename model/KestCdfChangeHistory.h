@@ -2,14 +2,15 @@
 // KestCdfChangeHistory: the CHANGE-HISTORY element, a view of an array of change entries.
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 #include "KestCdfChange.h"
-#include "KestCdfShared.h"
+#include "KestCdfSharedChild.h"
 
 namespace kest {
 
-class KestCdfChangeHistory {
+class KEST_API KestCdfChangeHistory {
   public:
     /// No array, count 0.
     KestCdfChangeHistory() = default;
@@ -42,7 +43,7 @@ class KestCdfChangeHistory {
   private:
     int CountChangeNodes(IXMLDOMNodePtr node);
 
-    detail::SharedChild<KestCdfChange> m_changes;
+    KestCdfSharedChild<KestCdfChange> m_changes;
     int m_count = 0;
 };
 

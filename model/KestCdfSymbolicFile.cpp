@@ -1,8 +1,8 @@
 #include "KestCdfSymbolicFile.h"
 
-#include "KestCdfDomWriting.h"
+#include "detail/DomWriting.h"
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 // A CRC is a 32-bit pattern: decimal text is read over the whole unsigned range, as hexadecimal

@@ -3,12 +3,13 @@
 // CRC of that file.
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfSymbolicFile {
+class KEST_API KestCdfSymbolicFile {
   public:
     /// Empty file name, CRC 0.
     KestCdfSymbolicFile() = default;

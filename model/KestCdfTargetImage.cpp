@@ -1,8 +1,8 @@
 #include "KestCdfTargetImage.h"
 
-#include "KestCdfDomWriting.h"
+#include "detail/DomWriting.h"
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 #include "KestCdfSymbolicFile.h"
 
 namespace kest {

@@ -3,12 +3,13 @@
 // of that file. The twin of KestCdfSymbolicFile, more lenient about a missing attribute.
 
 #include "../platform/Automation.h"
+#include "../platform/Export.h"
 #include "../platform/XmlDom.h"
 #include "../text/KestCdfNormalizedString.h"
 
 namespace kest {
 
-class KestCdfTargetImage {
+class KEST_API KestCdfTargetImage {
   public:
     /// Empty file name, CRC 0.
     KestCdfTargetImage() = default;

@@ -11,10 +11,12 @@
 
 #include "Document.h"
 
+#include "../platform/Export.h"
+
 namespace kest {
 namespace ops {
 
-std::string ExportCsv(const Document& document);
+KEST_API std::string ExportCsv(const Document& document);
 
 }  // namespace ops
 }  // namespace kest

@@ -16,6 +16,8 @@
 
 #include "Value.h"
 
+#include "../platform/Export.h"
+
 namespace kest {
 
 class KestCdfCalData;
@@ -73,7 +75,7 @@ struct Change {
     std::optional<std::string> dataVersion;
 };
 
-struct Document {
+struct KEST_API Document {
     std::string ns;
     std::optional<std::string> schemaInstance;
     std::optional<std::string> schemaLocation;
@@ -89,11 +91,11 @@ struct Document {
 
 /// The document of a tree: lists, items, axes and change entries up to the counts the tree
 /// keeps beside its arrays (what the writer writes); negative counts read as none.
-Document FromCalData(const KestCdfCalData& data);
+KEST_API Document FromCalData(const KestCdfCalData& data);
 
 /// A new tree holding the document. Dates go through KestCdfDate's checks: a date text it
 /// refuses throws KestCalmorphDLLError with the date's reason code (34 to 40).
-KestCdfCalData ToCalData(const Document& document);
+KEST_API KestCdfCalData ToCalData(const Document& document);
 
 }  // namespace ops
 }  // namespace kest

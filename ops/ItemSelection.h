@@ -6,6 +6,8 @@
 
 #include "Document.h"
 
+#include "../platform/Export.h"
+
 namespace kest {
 namespace ops {
 
@@ -26,11 +28,11 @@ struct ItemSelection {
 
 /// True when `name` matches `pattern`: exactly, or as a glob ('*' any run of characters, '?'
 /// one character, counted in bytes) when the pattern holds '*' or '?'.
-bool NameMatches(const std::string& pattern, const std::string& name);
+KEST_API bool NameMatches(const std::string& pattern, const std::string& name);
 
 /// The items whose name matches any of `patterns` (every item when there are none), in lists
 /// named `list` exactly (every list when it is empty).
-ItemSelection SelectItems(const Document& document, const std::vector<std::string>& patterns,
+KEST_API ItemSelection SelectItems(const Document& document, const std::vector<std::string>& patterns,
                           const std::string& list = std::string());
 
 }  // namespace ops

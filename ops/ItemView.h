@@ -13,16 +13,18 @@
 
 #include "ItemSelection.h"
 
+#include "../platform/Export.h"
+
 namespace kest {
 namespace ops {
 
 /// The text block of one item, ending in a line break.
-std::string ItemText(const ItemRef& ref);
+KEST_API std::string ItemText(const ItemRef& ref);
 
 /// The items as one JSON document: {"items": [...]}, each with list, name, format, units,
 /// annotation, note, shape, axes (units and points), values nested by the shape (a scalar
 /// alone) and finding (null or its message). Numbers are written by value.
-std::string ItemsJson(const std::vector<ItemRef>& items);
+KEST_API std::string ItemsJson(const std::vector<ItemRef>& items);
 
 }  // namespace ops
 }  // namespace kest

@@ -9,6 +9,8 @@
 
 #include "Document.h"
 
+#include "../platform/Export.h"
+
 namespace kest {
 namespace ops {
 
@@ -22,7 +24,7 @@ constexpr int kJsonMaxDepth = 32;
 
 /// A JSON text that import refuses: where (`path`, such as "lists[0].items[3].values[7]", or
 /// empty for the text as a whole) and why (`reason`, without the path). what() gives both.
-class JsonImportError : public std::runtime_error {
+class KEST_API JsonImportError : public std::runtime_error {
   public:
     JsonImportError(std::string path, std::string reason);
     const std::string& Path() const noexcept { return m_path; }
@@ -37,15 +39,15 @@ class JsonImportError : public std::runtime_error {
 using JsonSink = std::function<void(std::string_view)>;
 
 /// The document as JSON text, two-space indented, ending in a line break.
-std::string ExportJson(const Document& document);
+KEST_API std::string ExportJson(const Document& document);
 /// The same text, handed to `sink` in pieces of about a megabyte as it is written.
-void ExportJson(const Document& document, const JsonSink& sink);
+KEST_API void ExportJson(const Document& document, const JsonSink& sink);
 
 /// The document a JSON text holds. Throws JsonImportError for text that is not JSON, nested
 /// deeper than kJsonMaxDepth, or not a document of this format: a member missing, unknown or
 /// of the wrong type, a format type other than "NUMERIC", "STRING" and "LABEL", a number out of
 /// range, a text beyond kJsonMaxTextBytes, a date KestCdfDate refuses.
-Document ImportJson(std::string_view text);
+KEST_API Document ImportJson(std::string_view text);
 
 }  // namespace ops
 }  // namespace kest

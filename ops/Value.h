@@ -6,10 +6,12 @@
 #include <cstdint>
 #include <string>
 
+#include "../platform/Export.h"
+
 namespace kest {
 namespace ops {
 
-class Value {
+class KEST_API Value {
   public:
     enum class Kind : std::uint8_t { kEmpty, kInteger, kDouble, kString };
 
@@ -48,7 +50,7 @@ class Value {
 
 /// The shortest text that reads back as the same double, without a trailing ".0": 3, 2.5,
 /// 1e+20, -0, inf, -inf, nan.
-std::string FormatNumber(double value);
+KEST_API std::string FormatNumber(double value);
 
 }  // namespace ops
 }  // namespace kest

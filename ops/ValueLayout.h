@@ -15,6 +15,8 @@
 
 #include "Document.h"
 
+#include "../platform/Export.h"
+
 namespace kest {
 namespace ops {
 
@@ -28,7 +30,7 @@ struct Finding {
     std::string message;
 };
 
-struct ValueLayout {
+struct KEST_API ValueLayout {
     /// The dimensions: empty for a scalar, one entry for a 1-D array, one per axis for a curve
     /// or map laid out along its axes.
     std::vector<std::size_t> shape;
@@ -42,13 +44,13 @@ struct ValueLayout {
 };
 
 /// The number of points an axis stands for: its points, or its size attribute without them.
-std::size_t AxisLength(const Axis& axis);
+KEST_API std::size_t AxisLength(const Axis& axis);
 
 /// The layout of an item's values; `list` names the item's list in the finding.
-ValueLayout LayoutOf(const Item& item, const std::string& list = std::string());
+KEST_API ValueLayout LayoutOf(const Item& item, const std::string& list = std::string());
 
 /// The point of axis `axis` at `position`, or null when the item has no such axis or point.
-const Value* AxisPoint(const Item& item, std::size_t axis, std::size_t position);
+KEST_API const Value* AxisPoint(const Item& item, std::size_t axis, std::size_t position);
 
 }  // namespace ops
 }  // namespace kest

@@ -3,11 +3,12 @@
 
 #include <exception>
 
+#include "Export.h"
 #include "HResult.h"
 
 namespace kest {
 
-class CAtlException : public std::exception {
+class KEST_API CAtlException : public std::exception {
   public:
     explicit CAtlException(HRESULT hr) noexcept : m_hr(hr) {}
     operator HRESULT() const noexcept { return m_hr; }

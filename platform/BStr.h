@@ -11,6 +11,7 @@
 #include <string>
 #include <string_view>
 
+#include "Export.h"
 #include "HResult.h"
 
 namespace kest {
@@ -20,32 +21,32 @@ using BSTR = OLECHAR*;
 using LPCOLESTR = const OLECHAR*;
 
 /// New BSTR holding a copy of the zero-terminated text; null for a null argument or no memory.
-BSTR SysAllocString(const OLECHAR* text) noexcept;
+KEST_API BSTR SysAllocString(const OLECHAR* text) noexcept;
 /// New BSTR of `length` characters copied from `text` (zero-filled when `text` is null);
 /// null when memory runs out or the byte count would not fit in 32 bits.
-BSTR SysAllocStringLen(const OLECHAR* text, UINT length) noexcept;
+KEST_API BSTR SysAllocStringLen(const OLECHAR* text, UINT length) noexcept;
 /// New BSTR of `bytes` bytes copied from `data` (zero-filled when null); the bytes are not
 /// converted, as on the platform this type comes from.
-BSTR SysAllocStringByteLen(const char* data, UINT bytes) noexcept;
+KEST_API BSTR SysAllocStringByteLen(const char* data, UINT bytes) noexcept;
 /// Frees a BSTR made by the Sys* functions; null is allowed.
-void SysFreeString(BSTR text) noexcept;
+KEST_API void SysFreeString(BSTR text) noexcept;
 /// Replaces *target with a new copy of the text; false when memory runs out.
-bool SysReAllocString(BSTR* target, const OLECHAR* text) noexcept;
+KEST_API bool SysReAllocString(BSTR* target, const OLECHAR* text) noexcept;
 /// Number of UTF-16 code units; 0 for null.
-UINT SysStringLen(BSTR text) noexcept;
+KEST_API UINT SysStringLen(BSTR text) noexcept;
 /// Number of bytes; 0 for null.
-UINT SysStringByteLen(BSTR text) noexcept;
+KEST_API UINT SysStringByteLen(BSTR text) noexcept;
 
 /// Ordinal, case-sensitive comparison (null equals empty): VARCMP_LT, VARCMP_EQ or VARCMP_GT.
 /// The locale and flags are accepted for compatibility and do not change the result.
-HRESULT VarBstrCmp(BSTR left, BSTR right, LCID lcid, ULONG flags) noexcept;
+KEST_API HRESULT VarBstrCmp(BSTR left, BSTR right, LCID lcid, ULONG flags) noexcept;
 
 /// UTF-8 to UTF-16 (invalid sequences become U+FFFD).
-std::u16string Utf8ToUtf16(std::string_view utf8);
+KEST_API std::u16string Utf8ToUtf16(std::string_view utf8);
 /// UTF-16 to UTF-8 (unpaired surrogates become U+FFFD).
-std::string Utf16ToUtf8(std::u16string_view utf16);
+KEST_API std::string Utf16ToUtf8(std::u16string_view utf16);
 /// New BSTR from UTF-8 text; null when memory runs out.
-BSTR SysAllocStringFromUtf8(std::string_view utf8) noexcept;
+KEST_API BSTR SysAllocStringFromUtf8(std::string_view utf8) noexcept;
 /// View of a BSTR's text (empty for null), embedded zeros included.
 inline std::u16string_view BstrView(BSTR text) noexcept {
     return text ? std::u16string_view(text, SysStringLen(text)) : std::u16string_view();
@@ -53,6 +54,6 @@ inline std::u16string_view BstrView(BSTR text) noexcept {
 
 /// Test aid for out-of-memory paths: the next `count` BSTR allocations succeed and the one
 /// after fails as if memory had run out; a negative count (the default) turns this off.
-void SysFailAllocationAfter(long count) noexcept;
+KEST_API void SysFailAllocationAfter(long count) noexcept;
 
 }  // namespace kest

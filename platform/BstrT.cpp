@@ -148,13 +148,13 @@ _bstr_t _bstr_t::operator+(const _bstr_t& other) const {
     return result;
 }
 
-_bstr_t operator+(const char* left, const _bstr_t& right) {
+KEST_API _bstr_t operator+(const char* left, const _bstr_t& right) {
     _bstr_t result(left);
     result += right;
     return result;
 }
 
-_bstr_t operator+(const OLECHAR* left, const _bstr_t& right) {
+KEST_API _bstr_t operator+(const OLECHAR* left, const _bstr_t& right) {
     _bstr_t result(left);
     result += right;
     return result;

@@ -6,10 +6,11 @@
 #include <string_view>
 
 #include "BStr.h"
+#include "Export.h"
 
 namespace kest {
 
-class _bstr_t {
+class KEST_API _bstr_t {
   public:
     _bstr_t() noexcept = default;
     _bstr_t(const _bstr_t& other) noexcept;

@@ -5,12 +5,13 @@
 #include <string_view>
 
 #include "BStr.h"
+#include "Export.h"
 
 namespace kest {
 
 class _bstr_t;
 
-class CComBSTR {
+class KEST_API CComBSTR {
   public:
     CComBSTR() noexcept = default;
     /// A string of `length` zero characters.

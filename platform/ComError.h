@@ -4,11 +4,12 @@
 #include <exception>
 #include <string>
 
+#include "Export.h"
 #include "HResult.h"
 
 namespace kest {
 
-class _com_error : public std::exception {
+class KEST_API _com_error : public std::exception {
   public:
     /// An error for the given failure code, with an optional description.
     explicit _com_error(HRESULT hr, std::string description = std::string());
@@ -31,6 +32,6 @@ inline void ThrowIfFailed(HRESULT hr) {
     if (FAILED(hr)) throw _com_error(hr);
 }
 /// Text such as "E_OUTOFMEMORY (0x8007000E)" for a code.
-std::string HResultName(HRESULT hr);
+KEST_API std::string HResultName(HRESULT hr);
 
 }  // namespace kest

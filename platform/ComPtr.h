@@ -9,11 +9,12 @@
 
 #include "BStr.h"
 #include "ComError.h"
+#include "Export.h"
 
 namespace kest {
 
 /// Base of every reference-counted platform object; the count is thread-safe.
-class RefCounted {
+class KEST_API RefCounted {
   public:
     void AddRef() const noexcept { m_refs.fetch_add(1, std::memory_order_relaxed); }
     void Release() const noexcept {

@@ -11,6 +11,7 @@
 
 #include <cstddef>
 
+#include "Export.h"
 #include "IXMLDOMNamedNodeMap.h"
 #include "IXMLDOMNode.h"
 #include "IXMLDOMNodeList.h"
@@ -26,7 +27,7 @@ constexpr const OLECHAR* kProgIdXMLSchemaCache40 = u"Msxml2.XMLSchemaCache.4.0";
 /// Default limit of element nesting while loading.
 constexpr long kDefaultMaxElementDepth = 10000;
 
-class IXMLDOMDocument : public IXMLDOMNode {
+class KEST_API IXMLDOMDocument : public IXMLDOMNode {
   public:
     /// The root element, or an empty pointer.
     IXMLDOMElementPtr GetdocumentElement() const;
@@ -80,7 +81,7 @@ class IXMLDOMDocument : public IXMLDOMNode {
                                   detail::DomNode** node) noexcept;
 };
 
-class IXMLDOMDocument2 : public IXMLDOMDocument {
+class KEST_API IXMLDOMDocument2 : public IXMLDOMDocument {
   public:
     /// Properties: "ServerHTTPRequest" (bool: allow http/https sources and schema locations),
     /// "MaxElementDepth" (integer, 0 for the default). Extensions: "SchemaPath" (string: a

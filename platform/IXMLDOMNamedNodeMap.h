@@ -2,11 +2,12 @@
 // IXMLDOMNamedNodeMap: the attributes of an element (or the pseudo-attributes of the XML
 // declaration) in document order.
 
+#include "Export.h"
 #include "IXMLDOMNode.h"
 
 namespace kest {
 
-class IXMLDOMNamedNodeMap : public RefCounted {
+class KEST_API IXMLDOMNamedNodeMap : public RefCounted {
   public:
     /// The next attribute, or an empty pointer after the last one.
     virtual IXMLDOMNodePtr nextNode() = 0;

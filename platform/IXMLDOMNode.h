@@ -14,16 +14,20 @@
 
 #include "BstrT.h"
 #include "ComPtr.h"
+#include "Export.h"
 #include "VariantT.h"
 
 namespace kest {
 
+// Opaque handles of the DOM implementation; only their addresses appear here.
 namespace detail {
 struct DomDocument;
 struct DomNode;
-void DomAddRef(DomDocument* document) noexcept;
-void DomRelease(DomDocument* document) noexcept;
 }  // namespace detail
+
+/// Reference counting of a document, for the node pointers below.
+KEST_API void DomAddRef(detail::DomDocument* document) noexcept;
+KEST_API void DomRelease(detail::DomDocument* document) noexcept;
 
 enum DOMNodeType {
     NODE_INVALID = 0,
@@ -99,7 +103,7 @@ class DomPtr {
     bool operator==(std::nullptr_t) const noexcept { return m_handle.m_node == nullptr; }
     bool operator!=(std::nullptr_t) const noexcept { return m_handle.m_node != nullptr; }
     void Release() noexcept {
-        if (m_handle.m_doc) detail::DomRelease(m_handle.m_doc);
+        if (m_handle.m_doc) DomRelease(m_handle.m_doc);
         m_handle = I();
     }
     /// Documents only: creates a document by ProgID ("Msxml2.DOMDocument.4.0") or class id
@@ -111,7 +115,7 @@ class DomPtr {
         HRESULT hr = I::CreateDocument(progId, &document, &node);
         if (SUCCEEDED(hr)) {
             *this = DomPtr(document, node);
-            detail::DomRelease(document);  // CreateDocument returned one reference
+            DomRelease(document);  // CreateDocument returned one reference
         }
         return hr;
     }
@@ -119,7 +123,7 @@ class DomPtr {
     /// For the DOM implementation: a pointer to `node`, taking a new reference to `document`.
     DomPtr(detail::DomDocument* document, detail::DomNode* node) noexcept {
         if (document && node) {
-            detail::DomAddRef(document);
+            DomAddRef(document);
             m_handle.m_doc = document;
             m_handle.m_node = node;
         }
@@ -145,7 +149,7 @@ using IXMLDOMParseErrorPtr = ComPtr<IXMLDOMParseError>;
 using IXMLDOMSchemaCollectionPtr = ComPtr<IXMLDOMSchemaCollection>;
 
 /// Any node. Reached through a DomPtr.
-class IXMLDOMNode {
+class KEST_API IXMLDOMNode {
   public:
     /// The node's kind.
     DOMNodeType GetnodeType() const;
@@ -206,9 +210,9 @@ class IXMLDOMNode {
 };
 
 /// Kind checks used by the pointer conversions.
-bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept;
+KEST_API bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept;
 
-class IXMLDOMElement : public IXMLDOMNode {
+class KEST_API IXMLDOMElement : public IXMLDOMNode {
   public:
     /// The attribute with this qualified name, or an empty pointer.
     IXMLDOMAttributePtr getAttributeNode(const _bstr_t& name) const;
@@ -222,28 +226,28 @@ class IXMLDOMElement : public IXMLDOMNode {
     }
 };
 
-class IXMLDOMAttribute : public IXMLDOMNode {
+class KEST_API IXMLDOMAttribute : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_ATTRIBUTE);
     }
 };
 
-class IXMLDOMText : public IXMLDOMNode {
+class KEST_API IXMLDOMText : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_TEXT) || DomNodeIs(node, NODE_CDATA_SECTION);
     }
 };
 
-class IXMLDOMComment : public IXMLDOMNode {
+class KEST_API IXMLDOMComment : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_COMMENT);
     }
 };
 
-class IXMLDOMProcessingInstruction : public IXMLDOMNode {
+class KEST_API IXMLDOMProcessingInstruction : public IXMLDOMNode {
   public:
     static bool Accepts(const detail::DomNode* node) noexcept {
         return DomNodeIs(node, NODE_PROCESSING_INSTRUCTION);

@@ -1,11 +1,12 @@
 #pragma once
 // IXMLDOMNodeList: the children of a node, walked with nextNode in document order.
 
+#include "Export.h"
 #include "IXMLDOMNode.h"
 
 namespace kest {
 
-class IXMLDOMNodeList : public RefCounted {
+class KEST_API IXMLDOMNodeList : public RefCounted {
   public:
     /// The next node, or an empty pointer after the last one.
     virtual IXMLDOMNodePtr nextNode() = 0;

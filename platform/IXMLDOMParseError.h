@@ -1,6 +1,7 @@
 #pragma once
 // IXMLDOMParseError: why a load or a validation failed. Code 0 and an empty reason mean success.
 
+#include "Export.h"
 #include "IXMLDOMNode.h"
 
 namespace kest {
@@ -12,7 +13,7 @@ enum DomFailureCause : long {
     DOM_CAUSE_SCHEMA_UNAVAILABLE = 2,  ///< the named schema file is missing, or http while offline
 };
 
-class IXMLDOMParseError : public RefCounted {
+class KEST_API IXMLDOMParseError : public RefCounted {
   public:
     /// 0 on success; otherwise a failure code (XML_E_PARSEFAILED, XML_E_INVALID,
     /// E_ACCESSDENIED...).

@@ -2,11 +2,12 @@
 // IXMLDOMSchemaCollection: compiled XSD schemas by target namespace, attached to documents
 // for validate().
 
+#include "Export.h"
 #include "IXMLDOMNode.h"
 
 namespace kest {
 
-class IXMLDOMSchemaCollection : public RefCounted {
+class KEST_API IXMLDOMSchemaCollection : public RefCounted {
   public:
     /// Compiles the schema at `location` (a path or, when allowed, a URL) and registers it under
     /// `namespaceURI`. Throws _com_error when it cannot be read or compiled, or when its target
@@ -24,6 +25,8 @@ class IXMLDOMSchemaCollection : public RefCounted {
     /// Creates an empty collection for ProgID "Msxml2.XMLSchemaCache.4.0"; the caller owns the
     /// returned reference count of zero through ComPtr. Other names give REGDB_E_CLASSNOTREG.
     static HRESULT CreateInstance(const OLECHAR* progId, IXMLDOMSchemaCollection** result) noexcept;
+    /// True when the schema validator behind the collections and documents starts up.
+    static bool ValidatorUsable() noexcept;
 };
 
 }  // namespace kest

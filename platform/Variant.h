@@ -3,6 +3,7 @@
 // VT_BSTR, VT_BOOL, VT_VARIANT (inside arrays) and VT_ARRAY|VT_VARIANT.
 
 #include "BStr.h"
+#include "Export.h"
 #include "SafeArray.h"
 
 namespace kest {
@@ -21,7 +22,7 @@ enum VARENUM : VARTYPE {
     VT_ARRAY = 0x2000,
 };
 
-struct tagVARIANT {
+struct KEST_API tagVARIANT {
     VARTYPE vt;
     USHORT wReserved1;
     USHORT wReserved2;
@@ -39,11 +40,11 @@ struct tagVARIANT {
 };
 
 /// Sets the type to VT_EMPTY without freeing anything.
-void VariantInit(VARIANT* value) noexcept;
+KEST_API void VariantInit(VARIANT* value) noexcept;
 /// Frees what the value owns (string, array) and makes it VT_EMPTY.
-HRESULT VariantClear(VARIANT* value) noexcept;
+KEST_API HRESULT VariantClear(VARIANT* value) noexcept;
 /// Clears *target, then deep-copies *source into it (arrays with their elements).
-HRESULT VariantCopy(VARIANT* target, const VARIANT* source) noexcept;
+KEST_API HRESULT VariantCopy(VARIANT* target, const VARIANT* source) noexcept;
 /// Converts *source to type vt into *target (which may be source itself).
 ///
 /// To VT_BSTR: integers in decimal; doubles as the shortest text that reads back to the same
@@ -72,7 +73,7 @@ HRESULT VariantCopy(VARIANT* target, const VARIANT* source) noexcept;
 ///   and arrays convert only to their own type (a deep copy) and to VT_EMPTY; otherwise
 ///   DISP_E_TYPEMISMATCH. An unsupported type on either side is DISP_E_BADVARTYPE.
 /// - `flags` is accepted for compatibility and has no effect. On failure *target is unchanged.
-HRESULT VariantChangeType(VARIANT* target, const VARIANT* source, USHORT flags,
-                          VARTYPE vt) noexcept;
+KEST_API HRESULT VariantChangeType(VARIANT* target, const VARIANT* source, USHORT flags,
+                                   VARTYPE vt) noexcept;
 
 }  // namespace kest

@@ -5,11 +5,12 @@
 #include <string>
 
 #include "BstrT.h"
+#include "Export.h"
 #include "Variant.h"
 
 namespace kest {
 
-class _variant_t : public tagVARIANT {
+class KEST_API _variant_t : public tagVARIANT {
   public:
     _variant_t() noexcept;
     _variant_t(const VARIANT& source);

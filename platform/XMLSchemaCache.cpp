@@ -140,4 +140,6 @@ HRESULT IXMLDOMSchemaCollection::CreateInstance(const OLECHAR* progId,
     }
 }
 
+bool IXMLDOMSchemaCollection::ValidatorUsable() noexcept { return detail::SchemaValidatorUsable(); }
+
 }  // namespace kest

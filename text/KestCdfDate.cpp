@@ -3,7 +3,7 @@
 #include <cstring>
 #include <string>
 
-#include "../core/KestCalmorphDLLError.h"
+#include "../platform/KestCalmorphDLLError.h"
 
 namespace kest {
 

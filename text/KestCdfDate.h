@@ -5,10 +5,11 @@
 #include <ctime>
 
 #include "../platform/CComBSTR.h"
+#include "../platform/Export.h"
 
 namespace kest {
 
-class KestCdfDate {
+class KEST_API KestCdfDate {
   public:
     /// The current local time (thread-safe conversion).
     KestCdfDate();

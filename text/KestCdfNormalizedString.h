@@ -5,10 +5,11 @@
 
 #include "../platform/BstrT.h"
 #include "../platform/CComBSTR.h"
+#include "../platform/Export.h"
 
 namespace kest {
 
-class KestCdfNormalizedString {
+class KEST_API KestCdfNormalizedString {
   public:
     /// Empty value (null string).
     KestCdfNormalizedString() = default;

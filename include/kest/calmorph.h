@@ -3,12 +3,11 @@
 // One include for hosts; after `using namespace kest;` every public name is available.
 
 #include "platform/Automation.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 #include "text/KestCdfDate.h"
 #include "text/KestCdfNormalizedString.h"
-
-#include "core/KestCalmorphDLLError.h"
 
 #include "model/KestCdfAxis.h"
 #include "model/KestCdfCalData.h"

@@ -231,13 +231,13 @@ DomNode* FindAttribute(const DomNode* owner, std::string_view qname) noexcept {
 
 long LiveDocuments() noexcept { return g_liveDocuments.load(std::memory_order_relaxed); }
 
-void DomAddRef(DomDocument* document) noexcept { ++document->refs; }
+}  // namespace detail
 
-void DomRelease(DomDocument* document) noexcept {
+void DomAddRef(detail::DomDocument* document) noexcept { ++document->refs; }
+
+void DomRelease(detail::DomDocument* document) noexcept {
     if (--document->refs == 0) delete document;
 }
-
-}  // namespace detail
 
 bool DomNodeIs(const detail::DomNode* node, DOMNodeType type) noexcept {
     return node && node->name->type == type;

@@ -1,4 +1,4 @@
-#include "core/KestCalmorphDLLError.h"
+#include "platform/KestCalmorphDLLError.h"
 
 #include <gtest/gtest.h>
 

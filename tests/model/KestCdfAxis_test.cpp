@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "ValueListTestUtil.h"
-#include "core/KestCalmorphDLLError.h"
 #include "model/KestCdfAxis.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 using namespace kest;

@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "ValueListTestUtil.h"
-#include "core/KestCalmorphDLLError.h"
 #include "model/KestCdfCalItemValue.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 using namespace kest;

@@ -16,7 +16,7 @@
 #include <string>
 #include <vector>
 
-#include "model/KestCdfValueListCodec.h"
+#include "model/detail/ValueListCodec.h"
 #include "support/GermanLocale.h"
 
 using namespace kest;

@@ -6,8 +6,8 @@
 
 #include <string>
 
-#include "core/KestCalmorphDLLError.h"
 #include "platform/Automation.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 #include "text/KestCdfNormalizedString.h"
 

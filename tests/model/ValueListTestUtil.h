@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "core/KestCalmorphDLLError.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 namespace kest {

@@ -5,7 +5,7 @@
 #include <climits>
 #include <ctime>
 
-#include "core/KestCalmorphDLLError.h"
+#include "platform/KestCalmorphDLLError.h"
 
 using namespace kest;
 

@@ -1,4 +1,4 @@
-#include "KestCdfDomWriting.h"
+#include "DomWriting.h"
 
 #include <climits>
 #include <cstdint>

@@ -1,6 +1,6 @@
-#include "KestCdfValueListCodec.h"
+#include "ValueListCodec.h"
 
-#include "detail/ReadWarnings.h"
+#include "ReadWarnings.h"
 
 #include <locale.h>
 #include <stdlib.h>

@@ -1,16 +1,15 @@
-#include "KestCdfShared.h"
+#include "KestCdfSharedChild.h"
 
 #include <mutex>
 #include <unordered_map>
 
 namespace kest {
-namespace detail {
 namespace {
 
 // Trees may live on different threads, so the registry is guarded.
 struct Registry {
     std::mutex mutex;
-    std::unordered_map<const void*, std::weak_ptr<SharedAllocation>> entries;
+    std::unordered_map<const void*, std::weak_ptr<KestCdfSharedAllocation>> entries;
 };
 
 Registry& TheRegistry() {
@@ -20,7 +19,7 @@ Registry& TheRegistry() {
 
 }  // namespace
 
-SharedAllocation::~SharedAllocation() {
+KestCdfSharedAllocation::~KestCdfSharedAllocation() {
     if (!m_published.load(std::memory_order_acquire)) return;
     Registry& registry = TheRegistry();
     std::lock_guard<std::mutex> lock(registry.mutex);
@@ -29,7 +28,7 @@ SharedAllocation::~SharedAllocation() {
     if (it != registry.entries.end() && it->second.expired()) registry.entries.erase(it);
 }
 
-void SharedAllocation::Publish(const std::shared_ptr<SharedAllocation>& self) {
+void KestCdfSharedAllocation::Publish(const std::shared_ptr<KestCdfSharedAllocation>& self) {
     if (m_published.load(std::memory_order_acquire)) return;
     Registry& registry = TheRegistry();
     std::lock_guard<std::mutex> lock(registry.mutex);
@@ -38,12 +37,12 @@ void SharedAllocation::Publish(const std::shared_ptr<SharedAllocation>& self) {
     m_published.store(true, std::memory_order_release);
 }
 
-std::shared_ptr<SharedAllocation> FindLibraryAllocation(const void* p) {
+std::shared_ptr<KestCdfSharedAllocation> KestCdfSharedAllocation::Find(const void* p) {
     Registry& registry = TheRegistry();
     std::lock_guard<std::mutex> lock(registry.mutex);
     auto it = registry.entries.find(p);
-    return it == registry.entries.end() ? std::shared_ptr<SharedAllocation>() : it->second.lock();
+    return it == registry.entries.end() ? std::shared_ptr<KestCdfSharedAllocation>()
+                                        : it->second.lock();
 }
 
-}  // namespace detail
 }  // namespace kest

@@ -1,9 +1,9 @@
 #pragma once
 // Small DOM steps shared by the element readers and writers of the document model.
 
-#include "../platform/Automation.h"
-#include "../platform/XmlDom.h"
-#include "../text/KestCdfNormalizedString.h"
+#include "../../platform/Automation.h"
+#include "../../platform/XmlDom.h"
+#include "../../text/KestCdfNormalizedString.h"
 
 namespace kest {
 namespace detail {

@@ -1,5 +1,6 @@
 #pragma once
-// Shared ownership of the child arrays and objects of a calibration tree.
+// KestCdfSharedChild: how a calibration class holds a child array or child object. The model
+// classes hold their children this way; hosts reach them through the getters and setters only.
 //
 // Copies of a tree share their children: copying a parent copies the child pointer. The library
 // keeps a share of every array or object it allocated (readers, Create* functions) beside the
@@ -15,23 +16,26 @@
 #include <new>
 
 #include "../platform/ComError.h"
+#include "../platform/Export.h"
 #include "../platform/HResult.h"
 
 namespace kest {
-namespace detail {
 
 /// One library allocation; frees it (and leaves the registry) when the last share goes.
-class SharedAllocation {
+class KEST_API KestCdfSharedAllocation {
   public:
-    virtual ~SharedAllocation();
+    virtual ~KestCdfSharedAllocation();
     const void* Address() const noexcept { return m_address; }
     /// Number of objects allocated.
     std::size_t Length() const noexcept { return m_length; }
     /// Enters the allocation in the registry once, so a setter can find it.
-    void Publish(const std::shared_ptr<SharedAllocation>& self);
+    void Publish(const std::shared_ptr<KestCdfSharedAllocation>& self);
+    /// The share of a published library allocation that starts at `p`, or an empty one when
+    /// the library did not hand it out (or it is already gone).
+    static std::shared_ptr<KestCdfSharedAllocation> Find(const void* p);
 
   protected:
-    SharedAllocation(const void* address, std::size_t length) noexcept
+    KestCdfSharedAllocation(const void* address, std::size_t length) noexcept
         : m_address(address), m_length(length) {}
 
   private:
@@ -40,15 +44,13 @@ class SharedAllocation {
     std::atomic<bool> m_published{false};
 };
 
-/// The share of a published library allocation that starts at `p`, or an empty one when the
-/// library did not hand it out (or it is already gone).
-std::shared_ptr<SharedAllocation> FindLibraryAllocation(const void* p);
-
+/// A library allocation of an array (IsArray) or of one object of T.
 template <class T, bool IsArray>
-class TypedAllocation final : public SharedAllocation {
+class KestCdfTypedAllocation final : public KestCdfSharedAllocation {
   public:
-    TypedAllocation(T* p, std::size_t length) noexcept : SharedAllocation(p, length), m_p(p) {}
-    ~TypedAllocation() override {
+    KestCdfTypedAllocation(T* p, std::size_t length) noexcept
+        : KestCdfSharedAllocation(p, length), m_p(p) {}
+    ~KestCdfTypedAllocation() override {
         if (IsArray)
             delete[] m_p;
         else
@@ -59,8 +61,9 @@ class TypedAllocation final : public SharedAllocation {
     T* m_p;
 };
 
+/// A child pointer with the share that keeps a library allocation alive.
 template <class T>
-class SharedChild {
+class KestCdfSharedChild {
   public:
     /// The pointer, for the library's own use.
     T* get() const noexcept { return m_ptr; }
@@ -77,8 +80,8 @@ class SharedChild {
     T* AllocateArray(int count) {
         if (count < 0) throw std::bad_array_new_length();
         std::unique_ptr<T[]> array(new T[static_cast<std::size_t>(count)]);
-        m_owner = std::make_shared<TypedAllocation<T, true>>(array.get(),
-                                                             static_cast<std::size_t>(count));
+        m_owner = std::make_shared<KestCdfTypedAllocation<T, true>>(
+            array.get(), static_cast<std::size_t>(count));
         m_ptr = array.release();
         return m_ptr;
     }
@@ -86,7 +89,7 @@ class SharedChild {
     /// Allocates one default-constructed object and holds it.
     T* AllocateObject() {
         std::unique_ptr<T> object(new T());
-        m_owner = std::make_shared<TypedAllocation<T, false>>(object.get(), 1);
+        m_owner = std::make_shared<KestCdfTypedAllocation<T, false>>(object.get(), 1);
         m_ptr = object.release();
         return m_ptr;
     }
@@ -105,14 +108,13 @@ class SharedChild {
     /// Stores a pointer given by a host: shared when the library handed it out, else borrowed.
     void Set(T* p) {
         if (p == m_ptr) return;
-        m_owner = p ? FindLibraryAllocation(p) : std::shared_ptr<SharedAllocation>();
+        m_owner = p ? KestCdfSharedAllocation::Find(p) : std::shared_ptr<KestCdfSharedAllocation>();
         m_ptr = p;
     }
 
   private:
     T* m_ptr = nullptr;
-    std::shared_ptr<SharedAllocation> m_owner;
+    std::shared_ptr<KestCdfSharedAllocation> m_owner;
 };
 
-}  // namespace detail
 }  // namespace kest

@@ -2,6 +2,7 @@
 // KestCalmorphDLLError: the one error type the library throws for failures it detects itself.
 
 #include "../platform/CComBSTR.h"
+#include "Export.h"
 
 namespace kest {
 
@@ -43,8 +44,12 @@ constexpr int kSchemaNotLoaded = 44;          ///< data or schema file did not l
 constexpr int kSchemaLocationAbsent = 45;     ///< root has no xsi:schemaLocation
 }  // namespace reason
 
+/// A short English text for a reason code, for hosts and tools that show errors to people; an
+/// extension: the codes themselves carry no texts. "unknown reason" for a code never raised.
+KEST_API const char* ReasonText(int reason) noexcept;
+
 /// A reason code and a reason text. Copies never share their text.
-class KestCalmorphDLLError {
+class KEST_API KestCalmorphDLLError {
   public:
     /// Code 0 and an empty text.
     KestCalmorphDLLError() = default;

@@ -10,9 +10,9 @@
 #include <functional>
 #include <string_view>
 
-#include "../platform/Automation.h"
-#include "../text/KestCdfNormalizedString.h"
-#include "detail/NumberText.h"
+#include "../../platform/Automation.h"
+#include "../../text/KestCdfNormalizedString.h"
+#include "NumberText.h"
 
 namespace kest {
 namespace detail {
