@@ -42,29 +42,8 @@ class WriteScope {
 
 KestCalmorph::KestCalmorph() = default;
 
-KestCalmorph::KestCalmorph(const KestCalmorph& other)
-    : m_calData(other.m_calData),
-      m_writeDocument(other.m_writeDocument),
-      m_currentNode(other.m_currentNode),
-      m_documentPointer(other.m_documentPointer),
-      m_readOptions(other.m_readOptions),
-      m_lastLoadError(other.m_lastLoadError),
-      m_usedBuiltinSchema(other.m_usedBuiltinSchema),
-      m_writeOptions(other.m_writeOptions) {}
-
-KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
-    if (this != &other) {
-        m_calData = other.m_calData;
-        m_writeDocument = other.m_writeDocument;
-        m_currentNode = other.m_currentNode;
-        m_documentPointer = other.m_documentPointer;
-        m_readOptions = other.m_readOptions;
-        m_lastLoadError = other.m_lastLoadError;
-        m_usedBuiltinSchema = other.m_usedBuiltinSchema;
-        m_writeOptions = other.m_writeOptions;
-    }
-    return *this;
-}
+KestCalmorph::KestCalmorph(const KestCalmorph& other) = default;
+KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) = default;
 
 KestCalmorph::~KestCalmorph() {
     m_documentPointer.Release();

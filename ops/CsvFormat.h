@@ -9,9 +9,9 @@
 
 #include <string>
 
-#include "Document.h"
-
 #include "../platform/Export.h"
+
+#include "Document.h"
 
 namespace kest {
 namespace ops {

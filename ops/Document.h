@@ -14,9 +14,9 @@
 #include <string>
 #include <vector>
 
-#include "Value.h"
-
 #include "../platform/Export.h"
+
+#include "Value.h"
 
 namespace kest {
 
@@ -26,12 +26,12 @@ namespace ops {
 
 /// A value list: the elements of a VALUE or AXIS. `present` false stands for a list the tree
 /// holds no array for (VT_EMPTY), which the writer refuses; an array of no elements is present.
-struct ValueList {
+struct KEST_API ValueList {
     bool present = false;
     std::vector<Value> elements;
 };
 
-struct Axis {
+struct KEST_API Axis {
     /// The size attribute as written: a signed 32-bit number (the tree keeps its bits).
     std::int32_t size = 0;
     std::string units;
@@ -39,7 +39,7 @@ struct Axis {
     ValueList points;
 };
 
-struct Item {
+struct KEST_API Item {
     std::optional<std::string> name;
     /// Units and format type of the item's value; both null when the item has no value object.
     std::optional<std::string> units;
@@ -53,12 +53,12 @@ struct Item {
 };
 
 /// A SYMBOLIC-FILE or TARGET-IMAGE: a file name and the CRC-32 stored for it.
-struct FileRef {
+struct KEST_API FileRef {
     std::string name;
     std::uint32_t crc = 0;
 };
 
-struct CalList {
+struct KEST_API CalList {
     std::optional<std::string> name;
     std::optional<FileRef> symbolicFile;
     std::optional<FileRef> targetImage;
@@ -66,7 +66,7 @@ struct CalList {
     std::vector<Item> items;
 };
 
-struct Change {
+struct KEST_API Change {
     std::string user;
     /// "YYYY-MM-DDThh:mm:ss".
     std::string date;

@@ -11,9 +11,9 @@
 #include <string>
 #include <vector>
 
-#include "ItemSelection.h"
-
 #include "../platform/Export.h"
+
+#include "ItemSelection.h"
 
 namespace kest {
 namespace ops {

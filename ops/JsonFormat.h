@@ -7,9 +7,9 @@
 #include <string>
 #include <string_view>
 
-#include "Document.h"
-
 #include "../platform/Export.h"
+
+#include "Document.h"
 
 namespace kest {
 namespace ops {

@@ -13,15 +13,15 @@
 #include <string>
 #include <vector>
 
-#include "Document.h"
-
 #include "../platform/Export.h"
+
+#include "Document.h"
 
 namespace kest {
 namespace ops {
 
 /// Something about an item that the schema cannot see, for the check command and the reports.
-struct Finding {
+struct KEST_API Finding {
     /// A short stable name of the kind, such as "value-count".
     std::string kind;
     std::string list;

@@ -19,7 +19,6 @@ namespace detail {
 /// (never one of a process that is still running). After a power cut the target holds the old
 /// or the new content in full once the save has returned; a save cut short may leave the old
 /// content and a temporary file, which the next save removes.
-/// With `indent`, the text is indented as WriteXml's option says.
 void SaveAtomically(const DomNode* document, const std::string& path, bool indent = false);
 
 }  // namespace detail
