@@ -2,7 +2,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <iostream>
 #include <string>
 
@@ -155,10 +154,7 @@ TEST(DomLoad, DeepNestingHasItsOwnLimitWhichCanBeRaised) {
     ScratchDir dir;
     {
         IXMLDOMDocument2Ptr doc = NewDocument();
-        auto start = std::chrono::steady_clock::now();
         ASSERT_EQ(doc->loadBuffer(xml.data(), xml.size()), VARIANT_FALSE);
-        EXPECT_LT(std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count(),
-                  5.0);
         EXPECT_EQ(ReasonOf(doc), "element nesting deeper than 10000 at line 1, column 30001");
 
         doc->setProperty(u"MaxElementDepth", _variant_t(5L));
