@@ -208,9 +208,38 @@ TYPED_TEST(ValueElement, ReaderAndWriterFailures) {
 
 TYPED_TEST(ValueElement, NumericTextReadFromTheDocumentIsSplitAsSetValueSplitsIt) {
     using R = TypeParam;
-    for (const std::u16string& text : std::vector<std::u16string>{
-             u"", u" ", u"\u00e9", u"\U0001F600", u"7", u" 1 2", u"1 2.5 3", u"1\u00e9 2 \u20ac.5",
-             u"\t3 4\n", u"1e5 2 3.5e-7", std::u16string(400, u'9') + u" 0.25"}) {
+    // The reader splits the DOM's UTF-8 text, SetValue the UTF-16 text: the same elements.
+    const std::u16string longDigits = u"1." + std::u16string(300, u'0') + u"1";
+    const std::vector<std::u16string> texts = {u"",
+                                               u" ",
+                                               u"  ",
+                                               u"7",
+                                               u"1 2.5 3",
+                                               u" 1 2",
+                                               u"1 2 ",
+                                               u"1  2",
+                                               u"1\t2 3\n4",
+                                               u"\t5 \v6",
+                                               u"\u00e9",
+                                               u"\u20ac",
+                                               u"\U0001F600",
+                                               u"\u00e9 1",
+                                               u"1\u00e9 2.5\u20ac",
+                                               u"1\u00e9 2 \u20ac.5",
+                                               u"\u00a05 \u00855 \u30005",
+                                               u"-\u00e91 +\u00e9.5",
+                                               u"1.5\U0001F600e3 7",
+                                               u"1e\u00e95 2",
+                                               u"1e5 2 3.5e-7",
+                                               u"0x1\u00e9p3 0x\u00e9",
+                                               u"inf\u00e9 nan(\u00e9) nan(a\u00e9b) in\u00e9f",
+                                               u"\u00e9 \u00e9 \u00e9",
+                                               longDigits + u"\u00e9 " + longDigits,
+                                               u"1." + longDigits,
+                                               u"2147483648 -2147483649 1e400 4.9e-324",
+                                               std::u16string(400, u'9') + u" 0.25",
+                                               std::u16string(3000, u'\u20ac') + u" 8"};
+    for (const std::u16string& text : texts) {
         SCOPED_TRACE(Narrow(text));
         IXMLDOMDocument2Ptr doc = LoadDocument(R::Xml("NUMERIC", ""));
         IXMLDOMNodePtr element = doc->GetdocumentElement();
@@ -222,14 +251,7 @@ TYPED_TEST(ValueElement, NumericTextReadFromTheDocumentIsSplitAsSetValueSplitsIt
         ASSERT_TRUE(R::Read(read, element));
         auto expected = R::Fresh(u"NUMERIC");
         R::Set(expected, _variant_t(text));
-        const _variant_t want = R::Get(expected);
-        std::vector<Element> elements;
-        for (LONG i = 0; i < static_cast<LONG>(want.parray->rgsabound[0].cElements); ++i) {
-            _variant_t e;
-            ASSERT_EQ(S_OK, SafeArrayGetElement(want.parray, &i, &e));
-            elements.push_back(e.vt == VT_R8 ? R8(e.dblVal) : e.vt == VT_I4 ? I4(e.lVal) : Empty());
-        }
-        ExpectElements(R::Get(read), elements);
+        ExpectElements(R::Get(read), ElementsOf(R::Get(expected)));
     }
 }
 
