@@ -34,6 +34,7 @@ TEST(CComBSTR, ConstructionKeepsNullApartFromEmpty) {
     EXPECT_NE(CComBSTR(std::string()).m_str, nullptr);
     EXPECT_EQ(CComBSTR(3).View(), std::u16string(3, u'\0'));
     EXPECT_EQ(CComBSTR(2, u"abc").View(), u"ab");
+    EXPECT_EQ(CComBSTR(0, u"abc").m_str, nullptr);
     EXPECT_EQ(CComBSTR("gr\xC3\xBC\xC3\x9F").View(), u"gr\u00FC\u00DF");
     EXPECT_EQ(CComBSTR(std::string("a\0b", 3)).Length(), 3u);
     EXPECT_EQ(CComBSTR(u"x\u00E9").ToString(), "x\xC3\xA9");
