@@ -82,6 +82,7 @@ TEST(DomLoad, BadInputFailsWithReasonAndLocationAndLeavesDocumentEmpty) {
                   std::string::npos);
         EXPECT_GT(error->Getlinepos(), 0);
         EXPECT_FALSE(doc->GetfirstChild());
+        EXPECT_FALSE(doc->GetlastChild());
     }
 }
 
