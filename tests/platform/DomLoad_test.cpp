@@ -277,6 +277,9 @@ TEST(DomLoad, ValidateOnParseChecksTheSchemasTheRootNames) {
         return ReasonOf(d);
     };
     EXPECT_EQ(outcome(doc("xsi", "12"), true), "loaded");
+    std::string big = doc("xsi", "12");  // validated whole, beyond one read of the file
+    big.insert(big.size() - 4, "<!--" + std::string(600 * 1024, 'x') + "-->");
+    EXPECT_EQ(outcome(big, true), "loaded");
     EXPECT_NE(outcome(doc("xsi", "twelve"), true), "loaded");
     EXPECT_NE(outcome(doc("i", "twelve"), true), "loaded");  // whatever the prefix
     EXPECT_EQ(outcome(doc("xsi", "twelve"), false), "loaded");
