@@ -168,6 +168,7 @@ TEST(SchemaValidation, UnusableSchemasFailNamingTheLocation) {
         {kCdfNs, "folder.xsd", "not a regular file"},
         {kCdfNs, "entity.xsd", "external resource '" + kCdfXsd + "' refused"},
         {kCdfNs, "ftp://127.0.0.1/cdf.xsd", "unsupported scheme"},
+        {kCdfNs, "file://otherhost/cdf.xsd", "is not a local file URL"},
         {kCdfNs, "http://127.0.0.1:9/cdf.xsd",
          "schema location http://127.0.0.1:9/cdf.xsd requires the ServerHTTPRequest property"},
         {kCdfNs, "", "empty schema location"},
