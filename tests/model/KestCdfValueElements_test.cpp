@@ -44,7 +44,7 @@ struct AxisRules {
         v.SetFormatType(Text(format));
         return v;
     }
-    static constexpr int kEmptyReason = reason::kAxisValueEmpty;
+    static constexpr int kEmptyReason = 26;  // the published code hosts receive
 };
 
 struct ValueRules {
@@ -69,7 +69,7 @@ struct ValueRules {
         v.SetFormatType(Text(format));
         return v;
     }
-    static constexpr int kEmptyReason = reason::kCalItemValueMissing;
+    static constexpr int kEmptyReason = 29;  // the published code hosts receive
 
     template <class Rules>
     static typename Rules::Type ReadAs(const std::string& xml) {
