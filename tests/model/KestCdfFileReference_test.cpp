@@ -110,6 +110,7 @@ TYPED_TEST(FileReference, RoundTripsThroughReadWriteRead) {
 TYPED_TEST(FileReference, ReaderAndWriterFailures) {
     IXMLDOMDocument2Ptr doc;
     typename TypeParam::Type file;
+    EXPECT_EQ(file.GetCrc(), 0);  // a host's new reference starts without a CRC
     const std::u16string name = TypeParam::kName;
     // An element nested in the file name has no text.
     IXMLDOMNodePtr nested =
