@@ -95,6 +95,8 @@ TEST(BstrT, ConcatenationAndComparison) {
     EXPECT_EQ(a.View(), u"aa");
     EXPECT_TRUE(_bstr_t("A") < _bstr_t("a"));
     EXPECT_TRUE(_bstr_t("ab") != _bstr_t("a"));
+    EXPECT_TRUE(_bstr_t("ab") != u"a");
+    EXPECT_FALSE(_bstr_t("a") != u"a");
     EXPECT_TRUE(_bstr_t(u"\u00E9") == "\xC3\xA9");
     EXPECT_EQ(_bstr_t(std::u16string(u"a\0b", 3)).length(), 3u);
 }
