@@ -24,9 +24,11 @@ const std::string kOut1 = Utf16ToUtf8(kAxis1), kOut2 = Utf16ToUtf8(kAxis2),
 std::u16string Item(const std::u16string& body) { return u"<CAL-ITEM>" + body + u"</CAL-ITEM>"; }
 std::string ItemOut(const std::string& body) { return "<CAL-ITEM>" + body + "</CAL-ITEM>"; }
 
-auto Read = [](KestCdfCalItem& item, IXMLDOMNodePtr node) { item.ConvertCalItemNode(node); };
+auto Read = [](KestCdfCalItem& item, IXMLDOMNodePtr node) {
+    EXPECT_TRUE(item.ConvertCalItemNode(node));
+};
 auto Write = [](KestCdfCalItem& item, IXMLDOMNodePtr parent, IXMLDOMDocument2Ptr& doc) {
-    item.ConvertCalItemNodeToXML(parent, doc.GetInterfacePtr(), Ns(u""));
+    EXPECT_TRUE(item.ConvertCalItemNodeToXML(parent, doc.GetInterfacePtr(), Ns(u"")));
 };
 
 TEST(KestCdfCalItem, RoundTripsThroughReadWriteRead) {

@@ -27,9 +27,11 @@ std::string ItemOut(const char16_t* name) { return Utf16ToUtf8(Item(name)); }
 std::u16string List(const std::u16string& body) { return u"<CAL-LIST>" + body + u"</CAL-LIST>"; }
 std::string ListOut(const std::string& body) { return "<CAL-LIST>" + body + "</CAL-LIST>"; }
 
-auto Read = [](KestCdfCalList& list, IXMLDOMNodePtr node) { list.ConvertCalListNode(node); };
+auto Read = [](KestCdfCalList& list, IXMLDOMNodePtr node) {
+    EXPECT_TRUE(list.ConvertCalListNode(node));
+};
 auto Write = [](KestCdfCalList& list, IXMLDOMNodePtr parent, IXMLDOMDocument2Ptr& doc) {
-    list.ConvertCalListNodeToXML(parent, doc.GetInterfacePtr(), Ns(u""));
+    EXPECT_TRUE(list.ConvertCalListNodeToXML(parent, doc.GetInterfacePtr(), Ns(u"")));
 };
 
 TEST(KestCdfCalList, RoundTripsThroughReadWriteRead) {

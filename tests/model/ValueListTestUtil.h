@@ -49,6 +49,19 @@ inline void ExpectElements(const _variant_t& value, const std::vector<Element>& 
     }
 }
 
+/// The elements of an array as expectations for ExpectElements (numbers compared exactly).
+inline std::vector<Element> ElementsOf(const _variant_t& array) {
+    std::vector<Element> result;
+    for (LONG i = 0; i < static_cast<LONG>(array.parray->rgsabound[0].cElements); ++i) {
+        _variant_t e;
+        EXPECT_EQ(S_OK, SafeArrayGetElement(array.parray, &i, &e));
+        result.push_back(e.vt == VT_R8   ? R8(e.dblVal)
+                         : e.vt == VT_I4 ? I4(e.lVal)
+                                         : Element{e.vt, 0, {}});
+    }
+    return result;
+}
+
 inline std::string Narrow(const std::u16string& text) { return Utf16ToUtf8(text); }
 
 inline IXMLDOMDocument2Ptr LoadDocument(const std::string& xml) {

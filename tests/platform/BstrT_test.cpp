@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
+#include <functional>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -94,6 +95,8 @@ TEST(BstrT, ConcatenationAndComparison) {
     EXPECT_EQ(a.View(), u"aa");
     EXPECT_TRUE(_bstr_t("A") < _bstr_t("a"));
     EXPECT_TRUE(_bstr_t("ab") != _bstr_t("a"));
+    EXPECT_TRUE(_bstr_t("ab") != u"a");
+    EXPECT_FALSE(_bstr_t("a") != u"a");
     EXPECT_TRUE(_bstr_t(u"\u00E9") == "\xC3\xA9");
     EXPECT_EQ(_bstr_t(std::u16string(u"a\0b", 3)).length(), 3u);
 }
@@ -122,36 +125,19 @@ TEST(BstrT, OwnershipTransfer) {
 }
 
 TEST(BstrT, AllocationFailureThrowsComError) {
+    // Each action's first allocation fails.
+    _bstr_t x("x");
     struct Row {
         const char* label;
-        void (*action)();
-    } rows[] = {
-        {"utf8",
-         [] {
-             FailAfter fail(0);
-             _bstr_t text("x");
-         }},
-        {"wide",
-         [] {
-             FailAfter fail(0);
-             _bstr_t text(u"x");
-         }},
-        {"copy",
-         [] {
-             _bstr_t text("x");
-             FailAfter fail(0);
-             SysFreeString(text.copy());
-         }},
-        {"append",
-         [] {
-             _bstr_t text("x");
-             FailAfter fail(0);
-             text += text;
-         }},
-    };
+        std::function<void()> action;
+    } rows[] = {{"utf8", [] { _bstr_t text("x"); }},
+                {"wide", [] { _bstr_t text(u"x"); }},
+                {"copy", [&] { SysFreeString(x.copy()); }},
+                {"append", [&] { x += x; }}};
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
         try {
+            FailAfter fail(0);
             row.action();
             ADD_FAILURE() << "no exception";
         } catch (const _com_error& error) {

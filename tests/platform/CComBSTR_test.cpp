@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <functional>
+
 #include "platform/AtlException.h"
 
 using namespace kest;
@@ -13,7 +15,7 @@ struct FailAfter {
     ~FailAfter() { SysFailAllocationAfter(-1); }
 };
 
-HRESULT CaughtCode(void (*action)()) {
+HRESULT CaughtCode(const std::function<void()>& action) {
     try {
         action();
     } catch (const CAtlException& error) {
@@ -32,6 +34,7 @@ TEST(CComBSTR, ConstructionKeepsNullApartFromEmpty) {
     EXPECT_NE(CComBSTR(std::string()).m_str, nullptr);
     EXPECT_EQ(CComBSTR(3).View(), std::u16string(3, u'\0'));
     EXPECT_EQ(CComBSTR(2, u"abc").View(), u"ab");
+    EXPECT_EQ(CComBSTR(0, u"abc").m_str, nullptr);
     EXPECT_EQ(CComBSTR("gr\xC3\xBC\xC3\x9F").View(), u"gr\u00FC\u00DF");
     EXPECT_EQ(CComBSTR(std::string("a\0b", 3)).Length(), 3u);
     EXPECT_EQ(CComBSTR(u"x\u00E9").ToString(), "x\xC3\xA9");
@@ -104,40 +107,19 @@ TEST(CComBSTR, OwnershipTransfer) {
 }
 
 TEST(CComBSTR, AllocationFailureThrowsOrReportsOutOfMemory) {
+    // Each action's first allocation fails.
+    const CComBSTR x(u"x");
     struct Row {
         const char* label;
-        void (*action)();
-    } rows[] = {
-        {"wide constructor",
-         [] {
-             FailAfter fail(0);
-             CComBSTR text(u"x");
-         }},
-        {"utf8 constructor",
-         [] {
-             FailAfter fail(0);
-             CComBSTR text("x");
-         }},
-        {"length constructor",
-         [] {
-             FailAfter fail(0);
-             CComBSTR text(4);
-         }},
-        {"copy",
-         [] {
-             CComBSTR text(u"x");
-             FailAfter fail(0);
-             CComBSTR copy(text);
-         }},
-        {"operator+=",
-         [] {
-             CComBSTR text;
-             FailAfter fail(0);
-             text += u"x";
-         }},
-    };
+        std::function<void()> action;
+    } rows[] = {{"wide constructor", [] { CComBSTR text(u"x"); }},
+                {"utf8 constructor", [] { CComBSTR text("x"); }},
+                {"length constructor", [] { CComBSTR text(4); }},
+                {"copy", [&] { CComBSTR copy(x); }},
+                {"operator+=", [] { CComBSTR().operator+=(u"x"); }}};
     for (const Row& row : rows) {
         SCOPED_TRACE(row.label);
+        FailAfter fail(0);
         EXPECT_EQ(CaughtCode(row.action), E_OUTOFMEMORY);
     }
     CComBSTR text(u"kept"), other(u"other");

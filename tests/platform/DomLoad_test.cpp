@@ -2,7 +2,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <iostream>
 #include <string>
 
@@ -83,6 +82,7 @@ TEST(DomLoad, BadInputFailsWithReasonAndLocationAndLeavesDocumentEmpty) {
                   std::string::npos);
         EXPECT_GT(error->Getlinepos(), 0);
         EXPECT_FALSE(doc->GetfirstChild());
+        EXPECT_FALSE(doc->GetlastChild());
     }
 }
 
@@ -155,10 +155,7 @@ TEST(DomLoad, DeepNestingHasItsOwnLimitWhichCanBeRaised) {
     ScratchDir dir;
     {
         IXMLDOMDocument2Ptr doc = NewDocument();
-        auto start = std::chrono::steady_clock::now();
         ASSERT_EQ(doc->loadBuffer(xml.data(), xml.size()), VARIANT_FALSE);
-        EXPECT_LT(std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count(),
-                  5.0);
         EXPECT_EQ(ReasonOf(doc), "element nesting deeper than 10000 at line 1, column 30001");
 
         doc->setProperty(u"MaxElementDepth", _variant_t(5L));
@@ -280,6 +277,9 @@ TEST(DomLoad, ValidateOnParseChecksTheSchemasTheRootNames) {
         return ReasonOf(d);
     };
     EXPECT_EQ(outcome(doc("xsi", "12"), true), "loaded");
+    std::string big = doc("xsi", "12");  // validated whole, beyond one read of the file
+    big.insert(big.size() - 4, "<!--" + std::string(600 * 1024, 'x') + "-->");
+    EXPECT_EQ(outcome(big, true), "loaded");
     EXPECT_NE(outcome(doc("xsi", "twelve"), true), "loaded");
     EXPECT_NE(outcome(doc("i", "twelve"), true), "loaded");  // whatever the prefix
     EXPECT_EQ(outcome(doc("xsi", "twelve"), false), "loaded");

@@ -109,6 +109,10 @@ TEST(DomNode, ChildListsAreLiveAndIndexable) {
     while (IXMLDOMNodePtr n = list->nextNode()) walked += Utf8Of(n->GetnodeName());
     EXPECT_EQ(walked, "bcda");
     EXPECT_EQ(Utf8Of(r->GetlastChild()->GetpreviousSibling()->GetnodeName()), "d");
+    // After a change, an index at or past the one fetched last is counted afresh.
+    EXPECT_EQ(Utf8Of(list->Getitem(1)->GetnodeName()), "c");
+    r->appendChild(r->GetfirstChild());  // b moves to the end: c d a b
+    EXPECT_EQ(Utf8Of(list->Getitem(1)->GetnodeName()), "d");
 }
 
 TEST(DomNode, AttributeMapsAddReplaceAndRemove) {

@@ -49,6 +49,7 @@ TEST(XMLSchemaCache, CreateInstanceKnowsOnlyTheSchemaCacheProgId) {
         HRESULT expected;
     } rows[] = {
         {u"msxml2.xmlschemacache.4.0", S_OK},  // ProgIDs ignore case
+        {u"MSXML2.XMLSCHEMACACHE.4.0", S_OK},
         {u"Msxml2.XMLSchemaCache.6.0", REGDB_E_CLASSNOTREG},
         {u"Msxml2.DOMDocument.4.0", REGDB_E_CLASSNOTREG},
         {u"Msxml2.XMLSchemaCache.4.0 ", REGDB_E_CLASSNOTREG},

@@ -109,32 +109,12 @@ std::vector<Case> AllCases() {
 }
 
 void AppendCanonicalText(std::string& out, const std::string& text) {
+    static const std::map<char, std::string> kEscapes = {
+        {'&', "&amp;"}, {'<', "&lt;"},   {'>', "&gt;"},  {'"', "&quot;"},
+        {'\t', "&#9;"}, {'\n', "&#10;"}, {'\r', "&#13;"}};
     for (char c : text) {
-        switch (c) {
-            case '&':
-                out += "&amp;";
-                break;
-            case '<':
-                out += "&lt;";
-                break;
-            case '>':
-                out += "&gt;";
-                break;
-            case '"':
-                out += "&quot;";
-                break;
-            case '\t':
-                out += "&#9;";
-                break;
-            case '\n':
-                out += "&#10;";
-                break;
-            case '\r':
-                out += "&#13;";
-                break;
-            default:
-                out += c;
-        }
+        const auto escape = kEscapes.find(c);
+        out += escape == kEscapes.end() ? std::string(1, c) : escape->second;
     }
 }
 
