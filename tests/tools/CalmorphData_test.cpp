@@ -4,6 +4,7 @@
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <regex>
 #include <string>
 #include <vector>
 
@@ -174,8 +175,11 @@ TEST(CalmorphImport, ExportThenImportWritesWhatConvertWrites) {
                                  out, err),
                       0)
                 << err;
-            EXPECT_EQ(ReadWholeFile(folder.dir / "imported.cdf"),
-                      ReadWholeFile(folder.dir / "converted.cdf"));
+            // A change entry without a date is dated when it is read, so two runs may differ
+            // there by a second.
+            const std::regex date("<DATE>[^<]*</DATE>");
+            EXPECT_EQ(std::regex_replace(ReadWholeFile(folder.dir / "imported.cdf"), date, ""),
+                      std::regex_replace(ReadWholeFile(folder.dir / "converted.cdf"), date, ""));
         }
     }
 }
