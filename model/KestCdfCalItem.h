@@ -51,6 +51,9 @@ class KEST_API KestCdfCalItem {
     }
     /// The axis array (null when there is none).
     KestCdfAxis* GetAxis() const { return m_axes.Expose(); }
+    /// Extension: the axis array for reading, without handing it out (a pointer from here is
+    /// not recognised by SetAxis); null when there is none.
+    const KestCdfAxis* PeekAxes() const noexcept { return m_axes.get(); }
     /// Refers to `axes` without copying (ownership as for SetCalItemValue).
     void SetAxis(KestCdfAxis* axes) { m_axes.Set(axes); }
     /// Number of axes the writer emits; must not exceed the array's length.

@@ -7,7 +7,9 @@
 // Fields are quoted as RFC 4180 says (when they hold a comma, a quote, CR or LF; quotes
 // doubled); rows end in CR LF; the text is UTF-8 without a byte-order mark.
 
+#include <functional>
 #include <string>
+#include <string_view>
 
 #include "../platform/Export.h"
 
@@ -17,6 +19,9 @@ namespace kest {
 namespace ops {
 
 KEST_API std::string ExportCsv(const Document& document);
+/// The same text for the document of a tree, converted and handed to `sink` one list at a time.
+KEST_API void ExportCsv(const KestCdfCalData& data,
+                        const std::function<void(std::string_view)>& sink);
 
 }  // namespace ops
 }  // namespace kest

@@ -134,7 +134,7 @@ Item FromCalItem(const KestCdfCalItem& source) {
         item.format = Text(value->GetFormatType());
         item.values = FromStored(value->PeekValue());
     }
-    const KestCdfAxis* axes = source.GetAxis();
+    const KestCdfAxis* axes = source.PeekAxes();
     const int axisCount = Count(axes, source.GetAxisSize());
     item.axes.reserve(static_cast<std::size_t>(axisCount));
     for (int i = 0; i < axisCount; ++i) {
@@ -204,7 +204,7 @@ std::size_t Document::ItemCount() const noexcept {
     return count;
 }
 
-Document FromCalData(const KestCdfCalData& data) {
+Document HeaderOf(const KestCdfCalData& data) {
     Document document;
     document.ns = Text(data.GetNamespace());
     document.schemaInstance = Nullable(data.GetSchemaInstance());
@@ -226,11 +226,22 @@ Document FromCalData(const KestCdfCalData& data) {
         change.dataVersion = Nullable(source.GetDataVersion());
         document.history.push_back(std::move(change));
     }
+    return document;
+}
 
-    const KestCdfCalList* lists = data.GetCalLists();
-    const int listCount = Count(lists, data.GetCalListSize());
-    document.lists.reserve(static_cast<std::size_t>(listCount));
-    for (int i = 0; i < listCount; ++i) document.lists.push_back(FromCalList(lists[i]));
+std::size_t ListCount(const KestCdfCalData& data) {
+    return static_cast<std::size_t>(Count(data.GetCalLists(), data.GetCalListSize()));
+}
+
+CalList ListOf(const KestCdfCalData& data, std::size_t index) {
+    return FromCalList(data.GetCalLists()[index]);
+}
+
+Document FromCalData(const KestCdfCalData& data) {
+    Document document = HeaderOf(data);
+    const std::size_t listCount = ListCount(data);
+    document.lists.reserve(listCount);
+    for (std::size_t i = 0; i < listCount; ++i) document.lists.push_back(ListOf(data, i));
     return document;
 }
 

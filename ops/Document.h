@@ -93,6 +93,12 @@ struct KEST_API Document {
 /// keeps beside its arrays (what the writer writes); negative counts read as none.
 KEST_API Document FromCalData(const KestCdfCalData& data);
 
+/// The document of a tree without its lists, the number of lists and one list at a time: a
+/// large tree can be handled list by list (FromCalData is HeaderOf with every ListOf).
+KEST_API Document HeaderOf(const KestCdfCalData& data);
+KEST_API std::size_t ListCount(const KestCdfCalData& data);
+KEST_API CalList ListOf(const KestCdfCalData& data, std::size_t index);
+
 /// A new tree holding the document. Dates go through KestCdfDate's checks: a date text it
 /// refuses throws KestCalmorphDLLError with the date's reason code (34 to 40).
 KEST_API KestCdfCalData ToCalData(const Document& document);

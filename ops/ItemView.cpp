@@ -174,8 +174,8 @@ std::string ItemText(const ItemRef& ref) {
     if (layout.alongAxes && layout.shape.size() == 2) {
         const std::size_t rowsCount = layout.shape[0], columns = layout.shape[1];
         out += "  map: " + std::to_string(rowsCount) + " x " + std::to_string(columns) + " (" +
-               AxisLabel(item.axes[0], 0) + " down, " + AxisLabel(item.axes[1], 1) +
-               " across, " + valueLabel + ")\n";
+               AxisLabel(item.axes[0], 0) + " down, " + AxisLabel(item.axes[1], 1) + " across, " +
+               valueLabel + ")\n";
         std::vector<std::vector<std::string>> rows(1 + rowsCount);
         rows[0].push_back(AxisLabel(item.axes[0], 0) + " \\ " + AxisLabel(item.axes[1], 1));
         for (std::size_t c = 0; c < columns; ++c)
@@ -232,8 +232,7 @@ std::string ItemsJson(const std::vector<ItemRef>& items) {
             out += a ? ", {\"units\": " : "{\"units\": ";
             JsonString(out, item.axes[a].units);
             out += ", \"points\": ";
-            JsonNested(out, item.axes[a].points.elements,
-                       {item.axes[a].points.elements.size()});
+            JsonNested(out, item.axes[a].points.elements, {item.axes[a].points.elements.size()});
             out += '}';
         }
         out += "], \"values\": ";

@@ -222,7 +222,9 @@ class Path {
     explicit Path(std::string text = std::string()) : m_text(std::move(text)) {}
     Path Member(const char* key) const { return Path(m_text.empty() ? key : m_text + "." + key); }
     Path Index(std::size_t i) const { return Path(m_text + "[" + std::to_string(i) + "]"); }
-    [[noreturn]] void Fail(const std::string& reason) const { throw JsonImportError(m_text, reason); }
+    [[noreturn]] void Fail(const std::string& reason) const {
+        throw JsonImportError(m_text, reason);
+    }
     const std::string& Text() const { return m_text; }
 
   private:
@@ -372,8 +374,11 @@ std::optional<FileRef> ReadFileRef(const Json& value, const Path& path) {
     ref.name = m.String("name");
     const std::string crc = m.String("crc32");
     bool ok = crc.size() == 10 && crc[0] == '0' && (crc[1] == 'x' || crc[1] == 'X');
-    for (std::size_t i = 2; ok && i < crc.size(); ++i) ok = std::isxdigit(static_cast<unsigned char>(crc[i])) != 0;
-    if (!ok) m.At("crc32").Fail("expected \"0x\" and eight hexadecimal digits, found \"" + crc.substr(0, 40) + "\"");
+    for (std::size_t i = 2; ok && i < crc.size(); ++i)
+        ok = std::isxdigit(static_cast<unsigned char>(crc[i])) != 0;
+    if (!ok)
+        m.At("crc32").Fail("expected \"0x\" and eight hexadecimal digits, found \"" +
+                           crc.substr(0, 40) + "\"");
     ref.crc = static_cast<std::uint32_t>(std::stoul(crc.substr(2), nullptr, 16));
     return ref;
 }
@@ -447,9 +452,7 @@ class PathTrackingParser {
     bool null() { return Value(), m_dom.null(); }
     bool boolean(bool value) { return Value(), m_dom.boolean(value); }
     bool number_integer(number_integer_t value) { return Value(), m_dom.number_integer(value); }
-    bool number_unsigned(number_unsigned_t value) {
-        return Value(), m_dom.number_unsigned(value);
-    }
+    bool number_unsigned(number_unsigned_t value) { return Value(), m_dom.number_unsigned(value); }
     bool number_float(number_float_t value, const string_t& text) {
         return Value(), m_dom.number_float(value, text);
     }
@@ -484,8 +487,8 @@ class PathTrackingParser {
     void Open(bool array) {
         Value();
         if (m_frames.size() >= static_cast<std::size_t>(kJsonMaxDepth))
-            throw JsonImportError(PathOf(false), "nested deeper than " +
-                                                     std::to_string(kJsonMaxDepth) + " levels");
+            throw JsonImportError(
+                PathOf(false), "nested deeper than " + std::to_string(kJsonMaxDepth) + " levels");
         m_frames.push_back(Frame{array, 0, std::string()});
     }
     // The path of the last value started, or (`next`) of the one about to be.
@@ -518,10 +521,10 @@ std::string ExportJson(const Document& document) {
     return text;
 }
 
-void ExportJson(const Document& document, const JsonSink& sink) {
-    Writer w;
-    w.sink = &sink;
-    w.out.reserve((1u << 20) + 64 * 1024);
+namespace {
+
+// The document's members up to the opening of "lists".
+void WriteHead(Writer& w, const Document& document) {
     w.out += '{';
     w.Key(1, "format", true);
     w.String(kJsonFormatName);
@@ -563,37 +566,61 @@ void ExportJson(const Document& document, const JsonSink& sink) {
     w.out += ']';
     w.Key(1, "lists");
     w.out += '[';
-    for (std::size_t i = 0; i < document.lists.size(); ++i) {
-        const CalList& list = document.lists[i];
-        if (i) w.out += ',';
-        w.Line(2);
-        w.out += '{';
-        w.Key(3, "name", true);
-        w.Nullable(list.name);
-        w.Key(3, "symbolicFile");
-        WriteFileRef(w, 3, list.symbolicFile);
-        w.Key(3, "targetImage");
-        WriteFileRef(w, 3, list.targetImage);
-        w.Key(3, "note");
-        w.Nullable(list.note);
-        w.Key(3, "items");
-        w.out += '[';
-        for (std::size_t j = 0; j < list.items.size(); ++j) {
-            if (j) w.out += ',';
-            w.Line(4);
-            WriteItem(w, 4, list.items[j]);
-            w.Flush();
-        }
-        if (!list.items.empty()) w.Line(3);
-        w.out += ']';
-        w.Line(2);
-        w.out += '}';
+}
+
+void WriteList(Writer& w, const CalList& list, bool first) {
+    if (!first) w.out += ',';
+    w.Line(2);
+    w.out += '{';
+    w.Key(3, "name", true);
+    w.Nullable(list.name);
+    w.Key(3, "symbolicFile");
+    WriteFileRef(w, 3, list.symbolicFile);
+    w.Key(3, "targetImage");
+    WriteFileRef(w, 3, list.targetImage);
+    w.Key(3, "note");
+    w.Nullable(list.note);
+    w.Key(3, "items");
+    w.out += '[';
+    for (std::size_t j = 0; j < list.items.size(); ++j) {
+        if (j) w.out += ',';
+        w.Line(4);
+        WriteItem(w, 4, list.items[j]);
+        w.Flush();
     }
-    if (!document.lists.empty()) w.Line(1);
+    if (!list.items.empty()) w.Line(3);
+    w.out += ']';
+    w.Line(2);
+    w.out += '}';
+}
+
+void WriteTail(Writer& w, bool anyList) {
+    if (anyList) w.Line(1);
     w.out += ']';
     w.Line(0);
     w.out += "}\n";
     w.Flush(true);
+}
+
+}  // namespace
+
+void ExportJson(const Document& document, const JsonSink& sink) {
+    Writer w;
+    w.sink = &sink;
+    w.out.reserve((1u << 20) + 64 * 1024);
+    WriteHead(w, document);
+    for (std::size_t i = 0; i < document.lists.size(); ++i) WriteList(w, document.lists[i], i == 0);
+    WriteTail(w, !document.lists.empty());
+}
+
+void ExportJson(const KestCdfCalData& data, const JsonSink& sink) {
+    Writer w;
+    w.sink = &sink;
+    w.out.reserve((1u << 20) + 64 * 1024);
+    WriteHead(w, HeaderOf(data));
+    const std::size_t count = ListCount(data);
+    for (std::size_t i = 0; i < count; ++i) WriteList(w, ListOf(data, i), i == 0);
+    WriteTail(w, count != 0);
 }
 
 Document ImportJson(std::string_view text) {

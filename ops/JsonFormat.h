@@ -42,6 +42,9 @@ using JsonSink = std::function<void(std::string_view)>;
 KEST_API std::string ExportJson(const Document& document);
 /// The same text, handed to `sink` in pieces of about a megabyte as it is written.
 KEST_API void ExportJson(const Document& document, const JsonSink& sink);
+/// The same text for the document of a tree, converted one list at a time, so that a large
+/// tree never stands twice in memory.
+KEST_API void ExportJson(const KestCdfCalData& data, const JsonSink& sink);
 
 /// The document a JSON text holds. Throws JsonImportError for text that is not JSON, nested
 /// deeper than kJsonMaxDepth, or not a document of this format: a member missing, unknown or

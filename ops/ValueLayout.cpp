@@ -41,11 +41,10 @@ ValueLayout LayoutOf(const Item& item, const std::string& list) {
         return layout;
     }
     layout.shape.push_back(count);
-    layout.finding = Finding{"value-count", list, item.name.value_or(std::string()),
-                             std::to_string(count) + " values, but the axes give " + sizes +
-                                 (item.axes.size() > 1 && !overflow
-                                      ? " = " + std::to_string(product)
-                                      : std::string())};
+    layout.finding = Finding{
+        "value-count", list, item.name.value_or(std::string()),
+        std::to_string(count) + " values, but the axes give " + sizes +
+            (item.axes.size() > 1 && !overflow ? " = " + std::to_string(product) : std::string())};
     return layout;
 }
 

@@ -27,11 +27,9 @@ struct ExportOptions {
 int RunExport(const ExportOptions& options) {
     KestCalmorph converter;
     KestCdfCalData data;
-    ops::Document document;
     int code = GuardedRun({options.file}, [&] {
         ProgressLine progress("reading " + DisplayName(options.file));
         ReadCdf(converter, options.file, options.read, data);
-        document = ops::FromCalData(data);
         return kExitOk;
     });
     if (code != kExitOk) return code;
@@ -41,10 +39,12 @@ int RunExport(const ExportOptions& options) {
     return GuardedRun({target, Subject::Stage::kWrite}, [&] {
         OutputFile output(options.out);
         ProgressLine progress("writing " + DisplayName(target, true));
+        // Converted one list at a time and written as it comes.
+        const auto write = [&](std::string_view piece) { output.Write(piece); };
         if (options.format == "json")
-            ops::ExportJson(document, [&](std::string_view piece) { output.Write(piece); });
+            ops::ExportJson(data, write);
         else
-            output.Write(ops::ExportCsv(document));
+            ops::ExportCsv(data, write);
         output.Finish();
         return kExitOk;
     });

@@ -41,7 +41,8 @@ std::string ReadBack(const std::string& text, const test::ScratchDir& dir) {
     test::WriteWholeFile(dir / "back.cdf", text);
     KestCalmorph converter;
     CComBSTR message;
-    const KestCdfCalData back = converter.ConvertXMLtoCPP(CComBSTR(dir / "back.cdf"), true, message);
+    const KestCdfCalData back =
+        converter.ConvertXMLtoCPP(CComBSTR(dir / "back.cdf"), true, message);
     EXPECT_EQ(message.ToString(), "");
     return ops::ExportJson(ops::FromCalData(back));
 }

@@ -10,11 +10,16 @@ TEST(ItemSelection, NamesMatchExactlyOrAsGlobs) {
         const char* pattern;
         const char* name;
         bool matches;
-    } cases[] = {{"Idle", "Idle", true},         {"Idle", "IdleSpeed", false},
-                 {"Idle*", "IdleSpeed", true},   {"*Speed*", "IdleSpeedTarget", true},
-                 {"Idle?peed", "IdleSpeed", true}, {"Idle?peed", "Idlepeed", false},
-                 {"a*b*c", "axxbyyc", true},     {"a*b*c", "axxbyy", false},
-                 {"*", "", true},                {"[x]", "[x]", true}};
+    } cases[] = {{"Idle", "Idle", true},
+                 {"Idle", "IdleSpeed", false},
+                 {"Idle*", "IdleSpeed", true},
+                 {"*Speed*", "IdleSpeedTarget", true},
+                 {"Idle?peed", "IdleSpeed", true},
+                 {"Idle?peed", "Idlepeed", false},
+                 {"a*b*c", "axxbyyc", true},
+                 {"a*b*c", "axxbyy", false},
+                 {"*", "", true},
+                 {"[x]", "[x]", true}};
     for (const auto& c : cases)
         EXPECT_EQ(NameMatches(c.pattern, c.name), c.matches) << c.pattern << " " << c.name;
     // No exponential backtracking on many stars.

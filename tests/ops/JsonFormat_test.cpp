@@ -39,10 +39,11 @@ TEST(JsonFormat, ExportsValidateAgainstTheSchema) {
     if (std::system("/usr/bin/python3 -c 'import jsonschema' 2>/dev/null") != 0)
         GTEST_SKIP() << "python3-jsonschema is not installed";
     ScratchDir dir;
-    std::string command = "/usr/bin/python3 -c 'import json, sys, jsonschema\n"
-                          "schema = json.load(open(sys.argv[1]))\n"
-                          "for f in sys.argv[2:]: jsonschema.validate(json.load(open(f)), schema)' " +
-                          std::string(KEST_SOURCE_DIR) + "/docs/cdf-json.schema.json";
+    std::string command =
+        "/usr/bin/python3 -c 'import json, sys, jsonschema\n"
+        "schema = json.load(open(sys.argv[1]))\n"
+        "for f in sys.argv[2:]: jsonschema.validate(json.load(open(f)), schema)' " +
+        std::string(KEST_SOURCE_DIR) + "/docs/cdf-json.schema.json";
     int n = 0;
     for (const char* file : test::kOpsDataFiles)
         command += " " + dir.Write(std::to_string(n++) + ".json", Exported(file, dir));
@@ -61,10 +62,16 @@ TEST(JsonFormat, ElementsKeepKindAndValue) {
     item.units = "-";
     item.format = "NUMERIC";
     item.values.present = true;
-    item.values.elements = {Value::Integer(3), Value::Double(3.0), Value::Double(-0.0),
-                            Value::Double(inf), Value::Double(-inf),
-                            Value::Double(std::nan("")), Value::String("inf"), Value(),
-                            Value::Integer(-2147483647 - 1), Value::Double(0.1 + 0.2)};
+    item.values.elements = {Value::Integer(3),
+                            Value::Double(3.0),
+                            Value::Double(-0.0),
+                            Value::Double(inf),
+                            Value::Double(-inf),
+                            Value::Double(std::nan("")),
+                            Value::String("inf"),
+                            Value(),
+                            Value::Integer(-2147483647 - 1),
+                            Value::Double(0.1 + 0.2)};
     Document document;
     document.lists.push_back(CalList{"L", FileRef{"f", 0}, std::nullopt, std::nullopt, {item}});
     const std::string json = ExportJson(document);

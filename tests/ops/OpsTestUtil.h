@@ -11,8 +11,7 @@ namespace kest {
 namespace test {
 
 /// The files every form is tried on.
-inline const char* const kOpsDataFiles[] = {"examples/sample.cdf",
-                                            "tests/data/ops/edge.cdf",
+inline const char* const kOpsDataFiles[] = {"examples/sample.cdf", "tests/data/ops/edge.cdf",
                                             "tests/data/schema/valid-compact.cdf",
                                             "tests/data/schema/valid-indented.cdf"};
 

@@ -49,8 +49,9 @@ TEST(ValueLayout, ShapesFollowTheAxesOrFallBackToOneDimension) {
         ASSERT_EQ(layout.finding.has_value(), c.finding != nullptr);
         if (c.finding) {
             EXPECT_EQ(layout.finding->message, c.finding);
-            EXPECT_EQ(layout.finding->kind + " " + layout.finding->list + " " + layout.finding->item,
-                      "value-count L I");
+            EXPECT_EQ(
+                layout.finding->kind + " " + layout.finding->list + " " + layout.finding->item,
+                "value-count L I");
         }
     }
 }
@@ -80,11 +81,15 @@ TEST(Value, NumbersCompareAndPrintByValue) {
     const struct {
         Value value;
         const char* text;
-    } prints[] = {{Value::Double(-464.0), "-464"}, {Value::Integer(-464), "-464"},
+    } prints[] = {{Value::Double(-464.0), "-464"},
+                  {Value::Integer(-464), "-464"},
                   {Value::Double(0.1 + 0.2), "0.30000000000000004"},
-                  {Value::Double(1e20), "1e+20"}, {Value::Double(-0.0), "-0"},
-                  {Value::Double(-HUGE_VAL), "-inf"}, {Value::Double(nan), "nan"},
-                  {Value::String("a b"), "a b"}, {Value(), ""}};
+                  {Value::Double(1e20), "1e+20"},
+                  {Value::Double(-0.0), "-0"},
+                  {Value::Double(-HUGE_VAL), "-inf"},
+                  {Value::Double(nan), "nan"},
+                  {Value::String("a b"), "a b"},
+                  {Value(), ""}};
     for (const auto& p : prints) EXPECT_EQ(p.value.ToText(), p.text);
 }
 

@@ -88,7 +88,11 @@ TEST(CalmorphShow, PrintsItemsByTheirLayout) {
          {"  value: 6.5\n", "\n\nitem DiagProtocol", "  value: UDS_ON_CAN\n"},
          {},
          {}},
-        {"show sample.cdf --list Diagnostics", 0, {"item FaultLampMode", "    MEDIUM BLINK\n"}, {}, {}},
+        {"show sample.cdf --list Diagnostics",
+         0,
+         {"item FaultLampMode", "    MEDIUM BLINK\n"},
+         {},
+         {}},
         {"show edge.cdf Cube CountMismatch",
          0,
          {"  values: 2 x 2 x 2\n", "    [1,1,0] 6\n", "finding: 2 values, but the axes give 3\n"},
@@ -169,9 +173,11 @@ TEST(CalmorphImport, ExportThenImportWritesWhatConvertWrites) {
         SCOPED_TRACE(name);
         for (const char* indent : {"", " --indent"}) {
             std::string out, err;
-            EXPECT_EQ(folder.Run("export " + name + " --format json -o e.json && '" KEST_CALMORPH_EXE
-                                 "' import e.json -o imported.cdf" + indent + " && '" KEST_CALMORPH_EXE
-                                 "' convert " + name + " converted.cdf" + indent,
+            EXPECT_EQ(folder.Run("export " + name +
+                                     " --format json -o e.json && '" KEST_CALMORPH_EXE
+                                     "' import e.json -o imported.cdf" +
+                                     indent + " && '" KEST_CALMORPH_EXE "' convert " + name +
+                                     " converted.cdf" + indent,
                                  out, err),
                       0)
                 << err;
