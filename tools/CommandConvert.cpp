@@ -34,8 +34,7 @@ std::string WhyItWouldNotReadBack(const std::string& path, const ReadSettings& s
         if (error.code == 0) return message.ToString();
         return (error.line > 0 ? "line " + std::to_string(error.line) + ": " : "") + error.reason;
     } catch (const KestCalmorphDLLError& error) {
-        return "reason code " + std::to_string(error.GetReason()) + " (" +
-               ReasonMeaning(error.GetReason()) + ")";
+        return ReasonOf(error);
     } catch (const std::exception& error) {
         return error.what();
     }
