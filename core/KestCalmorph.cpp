@@ -42,27 +42,8 @@ class WriteScope {
 
 KestCalmorph::KestCalmorph() = default;
 
-KestCalmorph::KestCalmorph(const KestCalmorph& other)
-    : m_calData(other.m_calData),
-      m_writeDocument(other.m_writeDocument),
-      m_currentNode(other.m_currentNode),
-      m_documentPointer(other.m_documentPointer),
-      m_readOptions(other.m_readOptions),
-      m_lastLoadError(other.m_lastLoadError),
-      m_usedBuiltinSchema(other.m_usedBuiltinSchema) {}
-
-KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) {
-    if (this != &other) {
-        m_calData = other.m_calData;
-        m_writeDocument = other.m_writeDocument;
-        m_currentNode = other.m_currentNode;
-        m_documentPointer = other.m_documentPointer;
-        m_readOptions = other.m_readOptions;
-        m_lastLoadError = other.m_lastLoadError;
-        m_usedBuiltinSchema = other.m_usedBuiltinSchema;
-    }
-    return *this;
-}
+KestCalmorph::KestCalmorph(const KestCalmorph& other) = default;
+KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) = default;
 
 KestCalmorph::~KestCalmorph() {
     m_documentPointer.Release();
@@ -255,6 +236,7 @@ bool KestCalmorph::ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CCo
 
     WriteScope scope(m_writeDocument, m_currentNode);
     m_writeDocument = document.GetInterfacePtr();
+    if (m_writeOptions.indent) document->setProperty(_bstr_t(u"Indent"), _variant_t(true));
     CreateXMLEnvironment();
     // The whole tree is built before anything is saved: a writer that refuses the tree throws
     // here, and no file is touched.

@@ -11,6 +11,7 @@
 #include "../platform/XmlDom.h"
 #include "KestLoadError.h"
 #include "KestReadOptions.h"
+#include "KestWriteOptions.h"
 
 namespace kest {
 
@@ -38,6 +39,10 @@ class KEST_API KestCalmorph {
     bool ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment);
     /// A new default tree; the converter is not touched.
     KestCdfCalData ConvertCPPToXML();
+
+    /// Extension: the layout of the files ConvertCPPToXML writes (indentation, off by default).
+    void SetWriteOptions(const KestWriteOptions& options) { m_writeOptions = options; }
+    const KestWriteOptions& GetWriteOptions() const { return m_writeOptions; }
 
     /// A document a host parked on the converter (empty when none).
     IXMLDOMDocument2Ptr GetDocumentPointer();
@@ -99,6 +104,7 @@ class KEST_API KestCalmorph {
     KestReadOptions m_readOptions;
     KestLoadError m_lastLoadError;
     bool m_usedBuiltinSchema = false;
+    KestWriteOptions m_writeOptions;
 };
 
 }  // namespace kest

@@ -97,6 +97,13 @@ KestCdfAxis::~KestCdfAxis() = default;
 
 _variant_t KestCdfAxis::GetAxisValue() const { return m_value; }
 
+void KestCdfAxis::SetAxisElements(const _variant_t& elements) {
+    if (elements.vt != (VT_ARRAY | VT_VARIANT) || !elements.parray ||
+        elements.parray->cDims != 1)
+        throw _com_error(E_INVALIDARG);
+    m_value = elements;
+}
+
 void KestCdfAxis::SetAxisValue(_variant_t value) {
     // Converting first means a value without a text form fails before anything changes.
     const detail::ValueText text(value);

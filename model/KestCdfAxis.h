@@ -22,12 +22,17 @@ class KEST_API KestCdfAxis {
 
     /// A deep copy of the stored points (VT_EMPTY, or VT_ARRAY|VT_VARIANT).
     _variant_t GetAxisValue() const;
+    /// Extension: the stored points themselves, without a copy; valid until they change.
+    const _variant_t& PeekAxisValue() const noexcept { return m_value; }
     /// Stores new points read from `value` according to the format type, which must be set
     /// first. "NUMERIC" splits the text at spaces into VT_I4 or (when the text holds a '.')
     /// VT_R8 points, "STRING" takes the quoted strings, "LABEL" keeps the value as one point;
     /// any other format type leaves the stored value alone. A value without a text form (an
     /// array) throws _com_error and changes nothing.
     void SetAxisValue(_variant_t value);
+    /// Extension: stores a copy of `elements` (VT_ARRAY|VT_VARIANT, one dimension) as the
+    /// points as they stand, as SetValueElements does for item values.
+    void SetAxisElements(const _variant_t& elements);
 
     /// The number carried by the size attribute; never checked against the points.
     unsigned int GetSize() const noexcept { return m_size; }

@@ -37,9 +37,18 @@ class KEST_API KestCdfCalItem {
 
     /// Copy of the value object; throws _com_error(E_POINTER) when the item has none.
     KestCdfCalItemValue GetCalItemValue() const;
+    /// Extension: the value object itself, without a copy (null when the item has none); valid
+    /// while the tree holds it.
+    const KestCdfCalItemValue* PeekCalItemValue() const noexcept { return m_value.get(); }
     /// Refers to `value` without copying; an object the host allocated stays the host's and
     /// must outlive every copy of the tree.
     void SetCalItemValue(KestCdfCalItemValue* value) { m_value.Set(value); }
+    /// Extension: allocates a default value object that the tree owns (the last copy frees it),
+    /// refers to it and returns it.
+    KestCdfCalItemValue* CreateCalItemValue() {
+        m_value.AllocateObject();
+        return m_value.Expose();
+    }
     /// The axis array (null when there is none).
     KestCdfAxis* GetAxis() const { return m_axes.Expose(); }
     /// Refers to `axes` without copying (ownership as for SetCalItemValue).

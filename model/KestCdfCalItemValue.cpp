@@ -71,6 +71,13 @@ void KestCdfCalItemValue::SetValue(_variant_t value) {
     // Quoted text under any other format type keeps the stored value.
 }
 
+void KestCdfCalItemValue::SetValueElements(const _variant_t& elements) {
+    if (elements.vt != (VT_ARRAY | VT_VARIANT) || !elements.parray ||
+        elements.parray->cDims != 1)
+        throw _com_error(E_INVALIDARG);
+    m_value = elements;
+}
+
 int KestCdfCalItemValue::CountValues(std::u16string_view text) const noexcept {
     return detail::CountValues(detail::IsFormatType(m_formatType, detail::kFormatNumeric), text);
 }

@@ -22,11 +22,18 @@ class KEST_API KestCdfCalItemValue {
 
     /// A deep copy of the stored value (VT_EMPTY, or VT_ARRAY|VT_VARIANT).
     _variant_t GetValue() const;
+    /// Extension: the stored value itself, without a copy; valid until the value changes.
+    const _variant_t& PeekValue() const noexcept { return m_value; }
     /// Stores a new value list according to the format type, which must be set first, and to
     /// whether the object was read from a document: read "NUMERIC" text is split into numbers,
     /// read quoted "STRING" text into strings; otherwise the value is kept as one element. A
     /// value without a text form (an array) throws _com_error and changes nothing.
     void SetValue(_variant_t value);
+    /// Extension: stores a copy of `elements` (VT_ARRAY|VT_VARIANT, one dimension) as the
+    /// value as it stands, whatever the format type; the format type is not consulted and the
+    /// elements are not converted. Anything else throws _com_error(E_INVALIDARG) and changes
+    /// nothing. How a host puts typed numbers, strings and empty elements back (JSON import).
+    void SetValueElements(const _variant_t& elements);
 
     /// Copies of the format type and the units.
     KestCdfNormalizedString GetFormatType() const { return m_formatType; }

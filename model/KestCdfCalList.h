@@ -41,6 +41,16 @@ class KEST_API KestCdfCalList {
     KestCdfTargetImage GetTargetImage() const;
     /// Refers to `image` without copying (ownership as for SetSymbolicFile).
     void SetTargetImage(KestCdfTargetImage* image) { m_targetImage.Set(image); }
+    /// Extensions: allocate a default symbolic file or target image that the tree owns (the last
+    /// copy frees it), refer to it and return it.
+    KestCdfSymbolicFile* CreateSymbolicFile() {
+        m_symbolicFile.AllocateObject();
+        return m_symbolicFile.Expose();
+    }
+    KestCdfTargetImage* CreateTargetImage() {
+        m_targetImage.AllocateObject();
+        return m_targetImage.Expose();
+    }
     /// The item array (null when there is none).
     KestCdfCalItem* GetCalItems() const { return m_calItems.Expose(); }
     /// Refers to `items` without copying (ownership as for SetSymbolicFile).

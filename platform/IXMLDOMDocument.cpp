@@ -234,7 +234,7 @@ VARIANT_BOOL IXMLDOMDocument::loadBuffer(const void* data, std::size_t size) {
 void IXMLDOMDocument::save(const _variant_t& destination) {
     if (destination.vt != VT_BSTR)
         throw _com_error(E_INVALIDARG, "save takes a file path as a string");
-    detail::SaveAtomically(&m_doc->node, Utf16ToUtf8(BstrView(destination.bstrVal)));
+    detail::SaveAtomically(&m_doc->node, Utf16ToUtf8(BstrView(destination.bstrVal)), m_doc->indent);
 }
 
 IXMLDOMParseErrorPtr IXMLDOMDocument::GetparseError() const {
@@ -271,6 +271,8 @@ void IXMLDOMDocument2::setProperty(const _bstr_t& name, const _variant_t& value)
         m_doc->schemaPath = Utf8(_bstr_t(value));
     } else if (name == u"BuiltinSchemaFallback") {
         m_doc->builtinSchemaFallback = static_cast<bool>(value);
+    } else if (name == u"Indent") {
+        m_doc->indent = static_cast<bool>(value);
     } else {
         throw _com_error(E_INVALIDARG, "unknown property " + Utf8(name));
     }
@@ -282,6 +284,7 @@ _variant_t IXMLDOMDocument2::getProperty(const _bstr_t& name) const {
     if (name == u"SchemaPath") return _variant_t(_bstr_t(m_doc->schemaPath));
     if (name == u"BuiltinSchemaFallback") return _variant_t(m_doc->builtinSchemaFallback);
     if (name == u"UsedBuiltinSchema") return _variant_t(m_doc->usedBuiltinSchema);
+    if (name == u"Indent") return _variant_t(m_doc->indent);
     throw _com_error(E_INVALIDARG, "unknown property " + Utf8(name));
 }
 

@@ -89,7 +89,10 @@ class KEST_API IXMLDOMDocument2 : public IXMLDOMDocument {
     /// "BuiltinSchemaFallback" (bool: a root naming one missing local schema in the CDF
     /// namespace, or an http one without ServerHTTPRequest, is validated against the library's
     /// built-in cdf.xsd) and, to read only, "UsedBuiltinSchema" (the last load or validation
-    /// did so). Other names: E_INVALIDARG.
+    /// did so).
+    /// "Indent" (bool, off in a new document: save puts each child of an element holding only
+    /// elements on a line of its own, two spaces per level; an extension of ours). Other
+    /// names: E_INVALIDARG.
     void setProperty(const _bstr_t& name, const _variant_t& value);
     _variant_t getProperty(const _bstr_t& name) const;
     /// Attaches a schema collection used by validate(); an empty pointer detaches it.

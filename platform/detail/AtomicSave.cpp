@@ -62,7 +62,7 @@ mode_t DefaultMode() {
 
 }  // namespace
 
-void SaveAtomically(const DomNode* document, const std::string& path) {
+void SaveAtomically(const DomNode* document, const std::string& path, bool indent) {
     if (path.empty()) Fail(ENOENT, "cannot save to", path);
     // Saving through a symbolic link replaces the file it points to, not the link.
     std::string target = path;
@@ -113,7 +113,7 @@ void SaveAtomically(const DomNode* document, const std::string& path) {
     };
     std::string buffer;
     buffer.reserve(1024 * 1024 + 64 * 1024);
-    long unrepresentable = WriteXml(document, buffer, write);
+    long unrepresentable = WriteXml(document, buffer, write, indent);
     if (unrepresentable >= 0) {
         // The file would not load again: refuse it rather than report a save that loses data.
         char code[32];

@@ -19,7 +19,7 @@ namespace detail {
 /// (never one of a process that is still running). After a power cut the target holds the old
 /// or the new content in full once the save has returned; a save cut short may leave the old
 /// content and a temporary file, which the next save removes.
-void SaveAtomically(const DomNode* document, const std::string& path);
+void SaveAtomically(const DomNode* document, const std::string& path, bool indent = false);
 
 }  // namespace detail
 }  // namespace kest

@@ -174,6 +174,7 @@ struct DomDocument {
     bool builtinSchemaFallback = false;  // "BuiltinSchemaFallback"
     bool usedBuiltinSchema = false;      // "UsedBuiltinSchema": the last load or validation did
     long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
+    bool indent = false;       // save writes one element per line
     ComPtr<IXMLDOMSchemaCollection> schemas;
     DomError error;
     std::string url;  // where the current content was loaded from

@@ -236,9 +236,27 @@ void AppendLeaf(std::string& out, const DomNode* node) {
 
 constexpr std::size_t kFlushSize = 1024 * 1024;
 
-void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush) {
+// Indentation goes only where it cannot change a value: between the children of an element
+// that holds elements and no text.
+bool HoldsElementsOnly(const DomNode* element) {
+    bool elements = false;
+    for (const DomNode* child = element->FirstChild(); child; child = child->next) {
+        const DOMNodeType type = child->Type();
+        if (type == NODE_TEXT || type == NODE_CDATA_SECTION) return false;
+        elements = elements || type == NODE_ELEMENT;
+    }
+    return elements;
+}
+
+void AppendLineBreak(std::string& out, std::size_t depth) {
+    out += '\n';
+    out.append(depth * 2, ' ');
+}
+
+void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush, bool indent) {
     Scope scope;
     std::vector<std::size_t> marks;
+    std::vector<bool> indented;  // per open element: its children go on lines of their own
     const DomNode* node = root;
     for (;;) {
         if (node->Type() == NODE_ELEMENT) {
@@ -246,6 +264,8 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
             if (node->FirstChild()) {
                 out += '>';
                 marks.push_back(mark);
+                indented.push_back(indent && HoldsElementsOnly(node));
+                if (indented.back()) AppendLineBreak(out, indented.size());
                 node = node->FirstChild();
                 continue;
             }
@@ -256,14 +276,17 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
         }
         while (node != root && !node->next) {
             node = node->parent;
+            if (indented.back()) AppendLineBreak(out, indented.size() - 1);
             out += "</";
             out += node->Name();
             out += '>';
             scope.Pop(marks.back());
             marks.pop_back();
+            indented.pop_back();
         }
         if (node == root) return;
         node = node->next;
+        if (indented.back()) AppendLineBreak(out, indented.size());
         if (flush && out.size() >= kFlushSize) {
             flush(out);
             out.clear();
@@ -273,13 +296,13 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush)
 
 }  // namespace
 
-long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush) {
+long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush, bool indent) {
     t_unrepresentable = -1;
     if (node->Type() != NODE_DOCUMENT) {
-        AppendSubtree(out, node, flush);
+        AppendSubtree(out, node, flush, indent);
     } else {
         for (const DomNode* child = node->FirstChild(); child; child = child->next) {
-            AppendSubtree(out, child, flush);
+            AppendSubtree(out, child, flush, indent);
             out += '\n';
         }
     }

@@ -11,7 +11,8 @@
 // trailing '-' gets a space; "?>" inside a processing instruction becomes "? >".
 // The XML declaration is written from the document's "xml" processing instruction, with its
 // encoding always "UTF-8" (the bytes written are UTF-8); a document without one gets none.
-// No whitespace is added except a line break after each node at document level.
+// No whitespace is added except a line break after each node at document level, unless
+// indentation is asked for.
 
 #include <functional>
 #include <string>
@@ -31,7 +32,10 @@ using XmlFlush = std::function<void(std::string_view)>;
 /// Returns -1, or the first character met that XML 1.0 cannot carry (a control character other
 /// than TAB, LF, CR, or U+FFFE/U+FFFF): such text is written (as a character reference where
 /// escaped) but will not load again.
-long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush = nullptr);
+/// With `indent`, every child of an element that holds elements and no text starts a line of
+/// its own, indented by two spaces per level, and the element's end tag a line at its level.
+long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush = nullptr,
+              bool indent = false);
 
 }  // namespace detail
 }  // namespace kest
