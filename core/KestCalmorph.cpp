@@ -3,6 +3,8 @@
 
 #include "KestCalmorph.h"
 
+#include "../model/KestCdfReadWarnings.h"
+
 #include <utility>
 #include <vector>
 
@@ -42,14 +44,6 @@ class WriteScope {
 
 KestCalmorph::KestCalmorph() = default;
 
-KestCalmorph::KestCalmorph(const KestCalmorph& other) = default;
-KestCalmorph& KestCalmorph::operator=(const KestCalmorph& other) = default;
-
-KestCalmorph::~KestCalmorph() {
-    m_documentPointer.Release();
-    m_currentNode.Release();
-}
-
 // ---------------------------------------------------------------------------------------------
 // Reading
 
@@ -88,7 +82,8 @@ void KestCalmorph::RecordLoadResult(const IXMLDOMParseErrorPtr& result,
     // The parse error gives 0 both for the first byte and for "unknown".
     error.offset = offset > 0 || (error.line == 1 && error.column == 1) ? offset : -1;
     std::string url = result->Geturl().ToString();
-    error.file = url.empty() ? path.ToString() : url;
+    // A position inside another file (a schema) names that file; otherwise the path as given.
+    error.file = error.line > 0 && !url.empty() ? url : path.ToString();
     error.reason = result->GetreasonText().ToString();
     switch (result->Getcause()) {
         case DOM_CAUSE_UNKNOWN_ENCODING:
@@ -105,6 +100,29 @@ void KestCalmorph::RecordLoadResult(const IXMLDOMParseErrorPtr& result,
 KestCdfCalData KestCalmorph::ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CComBSTR& message) {
     m_lastLoadError = KestLoadError();
     m_usedBuiltinSchema = false;
+    m_readWarnings.clear();
+    m_readWarningsOmitted = 0;
+    // The readers of the value lists record their warnings in this scope; they are kept also
+    // when the read fails half way.
+    const std::string file = path.ToString();
+    detail::ReadWarningScope warnings;
+    struct Keep {
+        KestCalmorph& self;
+        const detail::ReadWarningScope& warnings;
+        const std::string& file;
+        ~Keep() {
+            try {
+                for (const detail::ReadWarningEntry& entry : warnings.Entries())
+                    self.m_readWarnings.push_back({file, entry.line, entry.column, entry.item,
+                                                   entry.token, entry.valueRead, entry.kind});
+                self.m_readWarningsOmitted = warnings.Omitted();
+            } catch (...) {
+                // Out of memory for the copies: the count says what was not kept.
+                self.m_readWarningsOmitted =
+                    warnings.Omitted() + warnings.Entries().size() - self.m_readWarnings.size();
+            }
+        }
+    } keep{*this, warnings, file};
     CComBSTR result = LoadXMLFile(std::move(path), IXMLDOMDocument2Ptr(), wantMessage);
     // Assigned only once the load returned, so that an exception leaves the caller's text alone.
     message = std::move(result);
@@ -224,6 +242,10 @@ void KestCalmorph::SetDocumentPointer(IXMLDOMDocument2Ptr document) {
 
 // ---------------------------------------------------------------------------------------------
 // Writing
+
+const std::vector<KestReadWarning>& KestCalmorph::GetReadWarnings() const { return m_readWarnings; }
+
+size_t KestCalmorph::GetReadWarningsOmitted() const { return m_readWarningsOmitted; }
 
 KestCdfCalData KestCalmorph::ConvertCPPToXML() { return KestCdfCalData(); }
 

@@ -3,6 +3,7 @@
 // CDF file, and answers the schema checks around a file.
 
 #include <string>
+#include <vector>
 
 #include "../model/KestCdfCalData.h"
 #include "../platform/CComBSTR.h"
@@ -12,6 +13,7 @@
 #include "KestLoadError.h"
 #include "KestReadOptions.h"
 #include "KestWriteOptions.h"
+#include "KestReadWarning.h"
 
 namespace kest {
 
@@ -23,15 +25,19 @@ constexpr const char* kCdfSchemaFileName = "cdf.xsd";
 class KEST_API KestCalmorph {
   public:
     KestCalmorph();
-    KestCalmorph(const KestCalmorph& other);
-    KestCalmorph& operator=(const KestCalmorph& other);
-    ~KestCalmorph();
+    KestCalmorph(const KestCalmorph& other) = default;
+    KestCalmorph& operator=(const KestCalmorph& other) = default;
+    ~KestCalmorph() = default;
 
     /// Loads the file (validating it against the schema it names) and converts its CAL-DATA
     /// element into the converter's tree; returns a copy of that tree. A file that does not load
     /// is no exception: the tree stays as it was and, when `wantMessage` is true, `message`
     /// receives the parser's reason. Conversion errors throw KestCalmorphDLLError.
     KestCdfCalData ConvertXMLtoCPP(CComBSTR path, bool wantMessage, CComBSTR& message);
+    /// Extension: the numbers of the last ConvertXMLtoCPP not taken whole (at most 1,000).
+    const std::vector<KestReadWarning>& GetReadWarnings() const;
+    /// Extension: how many warnings of the last ConvertXMLtoCPP were beyond those kept.
+    size_t GetReadWarningsOmitted() const;
     /// Writes `data` to `outputPath` as a UTF-8 CDF file, with `comment` as the first child of
     /// CAL-DATA when not empty. False for an empty path; throws KestCalmorphDLLError when the
     /// tree is incomplete (nothing is written) and _com_error when saving fails (an existing
@@ -98,6 +104,8 @@ class KEST_API KestCalmorph {
                           const CComBSTR& path);
 
     KestCdfCalData m_calData;
+    std::vector<KestReadWarning> m_readWarnings;
+    size_t m_readWarningsOmitted = 0;
     IXMLDOMDocument* m_writeDocument = nullptr;
     IXMLDOMNodePtr m_currentNode;
     IXMLDOMDocument2Ptr m_documentPointer;

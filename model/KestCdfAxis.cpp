@@ -8,9 +8,13 @@
 #include <utility>
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
+#include "KestCdfReadWarnings.h"
 
 namespace kest {
+
+using detail::AddAttribute;
 
 namespace {
 
@@ -69,20 +73,6 @@ const _bstr_t& FormatTypeName() {
 const _bstr_t& NoName() {
     static const _bstr_t name(u"");
     return name;
-}
-
-void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const _bstr_t& name, const _variant_t& value) {
-    IXMLDOMNodePtr attribute = doc->createAttribute(name);
-    attribute->PutnodeValue(value);
-    attributes->setNamedItem(attribute);
-}
-
-// A string member's value is lent to the DOM, which copies it.
-void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const _bstr_t& name, const KestCdfNormalizedString& value) {
-    const detail::LentText text(value.m_string.m_str);
-    AddAttribute(doc, attributes, name, text.Get());
 }
 
 }  // namespace
@@ -177,6 +167,11 @@ bool KestCdfAxis::ConvertAxisNode(IXMLDOMNodePtr node) {
         std::string_view utf8;
         if (detail::IsFormatType(m_formatType, detail::kFormatNumeric) &&
             child->GetnodeValueUtf8(utf8)) {
+            if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current()) {
+                long line = 0, column = 0;
+                child->GettextPosition(line, column);
+                warnings->SetText(utf8.data(), line, column);
+            }
             _variant_t array =
                 detail::NewValueArray(static_cast<ULONG>(detail::CountValues(true, utf8)));
             detail::FillNumbersUtf8(utf8, detail::NumberTyping::kWholeText, array);
@@ -223,10 +218,10 @@ bool KestCdfAxis::ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* d
 
     IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
     if (!attributes) KestCalmorphDLLError::Raise(reason::kAxisWriteNoAttributeMap);
-    AddAttribute(doc, attributes, SizeName(), SizeText(m_size));
+    AddAttribute(doc, attributes, SizeName(), SizeText(m_size).bstrVal);
     attributes = element->Getattributes();
-    AddAttribute(doc, attributes, UnitsName(), m_swUnits);
-    AddAttribute(doc, attributes, FormatTypeName(), m_formatType);
+    AddAttribute(doc, attributes, UnitsName(), m_swUnits.m_string);
+    AddAttribute(doc, attributes, FormatTypeName(), m_formatType.m_string);
 
     // The element stays attached with its attributes when there is nothing to write.
     if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kAxisValueEmpty);

@@ -61,7 +61,8 @@ void KestCdfCalData::SetNodeAttributes(IXMLDOMNamedNodeMapPtr attributes) {
             if (!roles[0]) roles[0] = attribute;
         } else if (view.substr(0, 6) == u"xmlns:" && !roles[1]) {
             const _bstr_t value = detail::TakeText(attribute->GetnodeValue());
-            if (BstrView(value) == u"http://www.w3.org/2001/XMLSchema-instance") roles[1] = attribute;
+            if (BstrView(value) == u"http://www.w3.org/2001/XMLSchema-instance")
+                roles[1] = attribute;
         }
     }
     if (roles[0] && roles[1]) {
@@ -105,7 +106,7 @@ int KestCdfCalData::CountCalList(IXMLDOMNodePtr node) {
     return count;
 }
 
-void KestCdfCalData::ReadChild(IXMLDOMNodePtr child, int& listIndex) {
+void KestCdfCalData::ReadChild(const IXMLDOMNodePtr& child, int& listIndex) {
     if (child->GetnodeType() != NODE_ELEMENT) return;
     const IXMLDOMNode& element = *child;
     auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };

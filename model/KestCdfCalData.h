@@ -87,7 +87,7 @@ class KEST_API KestCdfCalData {
     _bstr_t GetNodeString(IXMLDOMNodePtr node);
     int CountCalList(IXMLDOMNodePtr node);
     bool SetXMLAttributes(IXMLDOMNodePtr root);
-    void ReadChild(IXMLDOMNodePtr child, int& listIndex);
+    void ReadChild(const IXMLDOMNodePtr& child, int& listIndex);
     KestCdfCalList& FirstList() const;
 
     KestCdfNormalizedString m_namespace;

@@ -1,6 +1,7 @@
 #include "KestCdfCalItem.h"
 
 #include "detail/DomWriting.h"
+#include "KestCdfReadWarnings.h"
 
 #include "../platform/KestCalmorphDLLError.h"
 
@@ -30,7 +31,7 @@ int KestCdfCalItem::CountAxisNodes(IXMLDOMNodePtr node) {
     return count;
 }
 
-void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
+void KestCdfCalItem::ReadChild(const IXMLDOMNodePtr& child, int& axisIndex) {
     if (child->GetnodeType() != NODE_ELEMENT) return;
     const IXMLDOMNode& element = *child;
     auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };
@@ -42,6 +43,8 @@ void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
             while (IXMLDOMNodePtr part = parts->nextNode()) text = TextOf(part);
         }
         m_name.m_string = std::move(text);
+        if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current())
+            warnings->SetItem(m_name.ToString());
     } else if (named(u"AXIS")) {
         if (axisIndex < m_axisSize) m_axes.get()[axisIndex++].ConvertAxisNode(child);
     } else if (named(u"VALUE")) {
@@ -56,6 +59,8 @@ void KestCdfCalItem::ReadChild(IXMLDOMNodePtr child, int& axisIndex) {
 }
 
 bool KestCdfCalItem::ConvertCalItemNode(IXMLDOMNodePtr node) {
+    if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current())
+        warnings->SetItem({});
     m_axisSize = CountAxisNodes(node);
     m_axes.AllocateArray(m_axisSize);
     IXMLDOMNodeListPtr children = node->GetchildNodes();
@@ -78,7 +83,7 @@ bool KestCdfCalItem::ConvertCalItemNode(IXMLDOMNodePtr node) {
     return true;
 }
 
-void KestCdfCalItem::WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
+void KestCdfCalItem::WriteItem(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
                                const KestCdfNormalizedString& ns) {
     if (!doc) throw _com_error(E_POINTER);
     _bstr_t uri(ns.m_string.m_str, true);

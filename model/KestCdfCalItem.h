@@ -77,8 +77,9 @@ class KEST_API KestCdfCalItem {
 
   private:
     int CountAxisNodes(IXMLDOMNodePtr node);
-    void ReadChild(IXMLDOMNodePtr child, int& axisIndex);
-    void WriteItem(IXMLDOMNodePtr parent, IXMLDOMDocument* doc, const KestCdfNormalizedString& ns);
+    void ReadChild(const IXMLDOMNodePtr& child, int& axisIndex);
+    void WriteItem(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc,
+                   const KestCdfNormalizedString& ns);
 
     KestCdfNormalizedString m_name;
     KestCdfSharedChild<KestCdfAxis> m_axes;

@@ -4,9 +4,13 @@
 #include <utility>
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
+#include "KestCdfReadWarnings.h"
 
 namespace kest {
+
+using detail::AddAttribute;
 
 namespace {
 
@@ -26,15 +30,6 @@ const _bstr_t& FormatTypeName() {
 const _bstr_t& NoName() {
     static const _bstr_t name(u"");
     return name;
-}
-
-// The attribute's value is lent to the DOM, which copies it.
-void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const _bstr_t& name, const KestCdfNormalizedString& value) {
-    IXMLDOMNodePtr attribute = doc->createAttribute(name);
-    const detail::LentText text(value.m_string.m_str);
-    attribute->PutnodeValue(text.Get());
-    attributes->setNamedItem(attribute);
 }
 
 }  // namespace
@@ -128,6 +123,11 @@ bool KestCdfCalItemValue::ConvertCalItemValueNode(IXMLDOMNodePtr node) {
         std::string_view utf8;
         if (detail::IsFormatType(m_formatType, detail::kFormatNumeric) &&
             child->GetnodeValueUtf8(utf8)) {
+            if (detail::ReadWarningScope* warnings = detail::ReadWarningScope::Current()) {
+                long line = 0, column = 0;
+                child->GettextPosition(line, column);
+                warnings->SetText(utf8.data(), line, column);
+            }
             _variant_t array =
                 detail::NewValueArray(static_cast<ULONG>(detail::CountValues(true, utf8)));
             detail::FillNumbersUtf8(utf8, detail::NumberTyping::kPerToken, array);
@@ -163,8 +163,8 @@ bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent, IX
     parent->appendChild(element);
 
     IXMLDOMNamedNodeMapPtr attributes = element->Getattributes();
-    AddAttribute(doc, attributes, UnitsName(), m_units);
-    AddAttribute(doc, attributes, FormatTypeName(), m_formatType);
+    AddAttribute(doc, attributes, UnitsName(), m_units.m_string);
+    AddAttribute(doc, attributes, FormatTypeName(), m_formatType.m_string);
 
     // The element stays attached with its attributes when there is nothing to write.
     if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);

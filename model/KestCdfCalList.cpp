@@ -43,7 +43,7 @@ int KestCdfCalList::CountCalItem(IXMLDOMNodePtr node) {
     return count;
 }
 
-void KestCdfCalList::ReadChild(IXMLDOMNodePtr child, int& itemIndex) {
+void KestCdfCalList::ReadChild(const IXMLDOMNodePtr& child, int& itemIndex) {
     const IXMLDOMNode& element = *child;
     auto named = [&element](std::u16string_view candidate) { return element.NameIs(candidate); };
     if (named(u"NAME")) {

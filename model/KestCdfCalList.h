@@ -76,7 +76,7 @@ class KEST_API KestCdfCalList {
 
   private:
     int CountCalItem(IXMLDOMNodePtr node);
-    void ReadChild(IXMLDOMNodePtr child, int& itemIndex);
+    void ReadChild(const IXMLDOMNodePtr& child, int& itemIndex);
 
     KestCdfNormalizedString m_name;
     KestCdfSharedChild<KestCdfSymbolicFile> m_symbolicFile;

@@ -233,31 +233,10 @@ std::u16string Utf8ToUtf16(std::string_view utf8) {
     return result;
 }
 
-std::string Utf16ToUtf8(std::u16string_view utf16) {
+char* Utf16ToUtf8(std::u16string_view utf16, char* out) noexcept {
     const char16_t* p = utf16.data();
     const char16_t* end = p + utf16.size();
-    // Exact size first: one pass over the units is cheaper than growing the string.
-    std::size_t size = 0;
-    for (const char16_t* q = p; q < end;) {
-        if (end - q >= 4 && FourAscii(q)) {
-            size += 4;
-            q += 4;
-            continue;
-        }
-        char16_t unit = *q++;
-        if (unit < 0x80) {
-            size += 1;
-        } else if (unit < 0x800) {
-            size += 2;
-        } else if (unit >= 0xD800 && unit <= 0xDBFF && q < end && *q >= 0xDC00 && *q <= 0xDFFF) {
-            size += 4;
-            ++q;
-        } else {
-            size += 3;  // BMP character, or an unpaired surrogate written as U+FFFD
-        }
-    }
-    std::string result(size, '\0');
-    char* o = result.data();
+    char* o = out;
     while (p < end) {
         if (end - p >= 4 && FourAscii(p)) {
             o[0] = static_cast<char>(p[0]);
@@ -295,6 +274,33 @@ std::string Utf16ToUtf8(std::u16string_view utf16) {
             *o++ = static_cast<char>(0x80 | (code & 0x3F));
         }
     }
+    return o;
+}
+
+std::string Utf16ToUtf8(std::u16string_view utf16) {
+    const char16_t* const end = utf16.data() + utf16.size();
+    // Exact size first: one pass over the units is cheaper than growing the string.
+    std::size_t size = 0;
+    for (const char16_t* q = utf16.data(); q < end;) {
+        if (end - q >= 4 && FourAscii(q)) {
+            size += 4;
+            q += 4;
+            continue;
+        }
+        char16_t unit = *q++;
+        if (unit < 0x80) {
+            size += 1;
+        } else if (unit < 0x800) {
+            size += 2;
+        } else if (unit >= 0xD800 && unit <= 0xDBFF && q < end && *q >= 0xDC00 && *q <= 0xDFFF) {
+            size += 4;
+            ++q;
+        } else {
+            size += 3;  // BMP character, or an unpaired surrogate written as U+FFFD
+        }
+    }
+    std::string result(size, '\0');
+    Utf16ToUtf8(utf16, result.data());
     return result;
 }
 

@@ -45,6 +45,9 @@ KEST_API HRESULT VarBstrCmp(BSTR left, BSTR right, LCID lcid, ULONG flags) noexc
 KEST_API std::u16string Utf8ToUtf16(std::string_view utf8);
 /// UTF-16 to UTF-8 (unpaired surrogates become U+FFFD).
 KEST_API std::string Utf16ToUtf8(std::u16string_view utf16);
+/// The same conversion into `out`, which has room for three bytes per unit (a pair of units
+/// takes four); returns the end of what was written. The one UTF-8 encoder of the library.
+KEST_API char* Utf16ToUtf8(std::u16string_view utf16, char* out) noexcept;
 /// New BSTR from UTF-8 text; null when memory runs out.
 KEST_API BSTR SysAllocStringFromUtf8(std::string_view utf8) noexcept;
 /// View of a BSTR's text (empty for null), embedded zeros included.

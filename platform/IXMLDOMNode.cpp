@@ -91,6 +91,14 @@ void IXMLDOMNode::PutnodeValue(const _variant_t& value) {
     }
 }
 
+bool IXMLDOMNode::GettextPosition(long& line, long& column) const noexcept {
+    line = column = 0;
+    if (m_node->Type() != NODE_TEXT && m_node->Type() != NODE_CDATA_SECTION) return false;
+    line = static_cast<long>(m_node->TextLine());
+    column = static_cast<long>(m_node->TextColumn());
+    return line > 0;
+}
+
 bool IXMLDOMNode::GetnodeValueUtf8(std::string_view& text) const {
     switch (m_node->Type()) {
         case NODE_ATTRIBUTE:

@@ -170,6 +170,9 @@ class KEST_API IXMLDOMNode {
     /// its pseudo-attributes rather than stored (GetnodeValue gives it). The view stays valid
     /// until the node's value changes or the document dies.
     bool GetnodeValueUtf8(std::string_view& text) const;
+    /// Extension (no MSXML counterpart): where a text node read from a file starts, 1-based;
+    /// false (and 0, 0) for other nodes and for text created or changed since the load.
+    bool GettextPosition(long& line, long& column) const noexcept;
     /// Extension (no MSXML counterpart): PutnodeValue of a string given as UTF-8, stored
     /// without a detour through UTF-16. Same rules: E_FAIL for elements and documents; for the
     /// XML declaration the text is parsed as its pseudo-attributes. `utf8` must be valid UTF-8

@@ -95,7 +95,7 @@ SAFEARRAY* SafeArrayCreate(VARTYPE vt, UINT dims, SAFEARRAYBOUND* bounds) noexce
 
 HRESULT SafeArrayDestroy(SAFEARRAY* array) noexcept {
     if (!array) return E_INVALIDARG;
-    if (array->cLocks > 0) return DISP_E_ARRAYISLOCKED;
+    if (__atomic_load_n(&array->cLocks, __ATOMIC_ACQUIRE) > 0) return DISP_E_ARRAYISLOCKED;
     for (ULONG i = 0; i < CountOf(array); ++i) VariantClear(array->pvData + i);
     FreeArray(array);
     return S_OK;
@@ -133,7 +133,7 @@ HRESULT SafeArrayGetElement(SAFEARRAY* array, const LONG* index, void* value) no
 
 HRESULT SafeArrayRedim(SAFEARRAY* array, SAFEARRAYBOUND* bound) noexcept {
     if (!array || !bound) return E_INVALIDARG;
-    if (array->cLocks > 0) return DISP_E_ARRAYISLOCKED;
+    if (__atomic_load_n(&array->cLocks, __ATOMIC_ACQUIRE) > 0) return DISP_E_ARRAYISLOCKED;
     ULONG count = bound->cElements;
     if (!BoundsFit(bound->lLbound, count)) return E_INVALIDARG;
     ArrayBlock* block = BlockOf(array);
@@ -189,18 +189,27 @@ HRESULT SafeArrayGetUBound(SAFEARRAY* array, UINT dim, LONG* bound) noexcept {
 
 UINT SafeArrayGetDim(SAFEARRAY* array) noexcept { return array ? array->cDims : 0; }
 
+// The lock count is changed atomically: copies of a tree share their value arrays, and
+// threads writing copies lock the same array for reading at the same time. Everything else
+// about an array (its elements, its size) is only read while it is shared.
 HRESULT SafeArrayAccessData(SAFEARRAY* array, void** data) noexcept {
     if (!array || !data) return E_INVALIDARG;
-    if (array->cLocks == std::numeric_limits<ULONG>::max()) return E_UNEXPECTED;
-    ++array->cLocks;
+    ULONG locks = __atomic_load_n(&array->cLocks, __ATOMIC_RELAXED);
+    do {
+        if (locks == std::numeric_limits<ULONG>::max()) return E_UNEXPECTED;
+    } while (!__atomic_compare_exchange_n(&array->cLocks, &locks, locks + 1, true, __ATOMIC_ACQUIRE,
+                                          __ATOMIC_RELAXED));
     *data = array->pvData;
     return S_OK;
 }
 
 HRESULT SafeArrayUnaccessData(SAFEARRAY* array) noexcept {
     if (!array) return E_INVALIDARG;
-    if (array->cLocks == 0) return E_UNEXPECTED;
-    --array->cLocks;
+    ULONG locks = __atomic_load_n(&array->cLocks, __ATOMIC_RELAXED);
+    do {
+        if (locks == 0) return E_UNEXPECTED;
+    } while (!__atomic_compare_exchange_n(&array->cLocks, &locks, locks - 1, true, __ATOMIC_RELEASE,
+                                          __ATOMIC_RELAXED));
     return S_OK;
 }
 

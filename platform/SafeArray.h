@@ -20,6 +20,10 @@ struct KEST_API SAFEARRAYBOUND {
 /// SafeArrayCreate/SafeArrayCreateVector/SafeArrayCopy: it sits in a larger hidden block that
 /// records how many elements pvData has room for, so that SafeArrayRedim grows the storage by
 /// doubling and a loop that adds one element at a time stays linear.
+///
+/// Sharing: any number of threads may read one array at a time (SafeArrayAccessData, element
+/// reads, copies), as threads writing copies of one tree do; the lock count is atomic. A thread
+/// that changes an array (put, redim, destroy) must have it to itself.
 struct KEST_API SAFEARRAY {
     USHORT cDims;
     USHORT fFeatures;

@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Builds the library and runs the whole test suite. Usage: scripts/test.sh [dev|asan|release]
+# Builds the library and runs the whole test suite. Usage: scripts/test.sh [dev|asan|tsan|release]
 set -euo pipefail
 cd "$(dirname "$0")/.."
 preset=${1:-dev}

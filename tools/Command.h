@@ -18,5 +18,8 @@ Command AddInfoCommand(CLI::App& calmorph);
 Command AddConvertCommand(CLI::App& calmorph);
 Command AddValidateCommand(CLI::App& calmorph);
 Command AddSchemaLocationCommand(CLI::App& calmorph);
+Command AddShowCommand(CLI::App& calmorph);
+Command AddExportCommand(CLI::App& calmorph);
+Command AddImportCommand(CLI::App& calmorph);
 
 }  // namespace kest::tool

@@ -18,6 +18,7 @@ struct ConvertOptions {
     std::string in;
     std::string out;
     std::string comment;
+    bool indent = false;
     ReadSettings read;
 };
 
@@ -55,6 +56,7 @@ int RunConvert(const ConvertOptions& options) {
     StagedOutput output(options.out);
     const std::string shown = DisplayName(options.out, true);
     Subject subject{options.out, Subject::Stage::kWrite, output.Path()};
+    converter.SetWriteOptions(KestWriteOptions{options.indent});
     return GuardedRun(subject, [&] {
         if (!converter.ConvertCPPToXML(data, CComBSTR(output.Path()), CComBSTR(options.comment))) {
             throw ToolError(kExitCannotWrite, shown, "nothing was written");
@@ -81,6 +83,8 @@ Command AddConvertCommand(CLI::App& calmorph) {
     app->add_option("OUT", options->out, "the file to write; - writes standard output")->required();
     app->add_option("--comment", options->comment, "a comment written at the start of CAL-DATA")
         ->type_name("TEXT");
+    app->add_flag("--indent", options->indent,
+                  "one element per line, two spaces a level (for line diffs)");
     AddReadOptions(*app, options->read);
     app->footer(
         "Exit codes:\n"

@@ -17,9 +17,17 @@ constexpr const char* kOverview =
     "  calmorph info FILE [--items] [READ OPTIONS]\n"
     "      Print the header, change history and calibration lists of FILE; with --items\n"
     "      also every item (name, units, format type, number of values, axis sizes).\n"
-    "  calmorph convert IN OUT [--comment TEXT] [READ OPTIONS]\n"
+    "  calmorph show FILE [ITEM...] [--list NAME] [--json] [READ OPTIONS]\n"
+    "      Print items (all, or those named; * and ? match any text and one character)\n"
+    "      with their values: a scalar, a curve as a table, a map as a grid.\n"
+    "  calmorph convert IN OUT [--comment TEXT] [--indent] [READ OPTIONS]\n"
     "      Read IN and write it to OUT as a UTF-8 CDF file, with TEXT as a comment at the\n"
     "      start of CAL-DATA. OUT is replaced only when the whole file could be written.\n"
+    "      --indent: one element per line, for line diffs.\n"
+    "  calmorph export FILE --format json|csv [-o OUT] [READ OPTIONS]\n"
+    "      Write everything FILE holds as JSON (lossless), or its values as CSV.\n"
+    "  calmorph import FILE.json -o OUT [--indent]\n"
+    "      Write the CDF file a JSON export stands for.\n"
     "  calmorph validate FILE... [--schema XSD]\n"
     "      Check each FILE against the schema it names (xsi:schemaLocation, resolved beside\n"
     "      the file), or against XSD under the CDF namespace. One line per file.\n"
@@ -44,12 +52,14 @@ constexpr const char* kOverview =
     "     with --strict also any warning\n"
     "  5  the output file cannot be written\n"
     "  6  the file names no schema (no xsi:schemaLocation on its root)\n"
+    "  7  show: an ITEM or the --list NAME matches nothing\n"
     "With several files, validate exits with the highest code of any file.\n"
     "Errors go to standard error as FILE:LINE:COL: error: TEXT, as far as the position is known.";
 
 // Every command of the tool, in the order of the help text.
-constexpr Command (*kCommands[])(CLI::App&) = {AddInfoCommand, AddConvertCommand,
-                                               AddValidateCommand, AddSchemaLocationCommand};
+constexpr Command (*kCommands[])(CLI::App&) = {
+    AddInfoCommand,     AddShowCommand,   AddConvertCommand,         AddExportCommand,
+    AddImportCommand,   AddValidateCommand, AddSchemaLocationCommand};
 
 }  // namespace
 

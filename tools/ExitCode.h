@@ -11,6 +11,7 @@ enum ExitCode {
     kExitConversion = 4,
     kExitCannotWrite = 5,
     kExitNoSchema = 6,
+    kExitNotFound = 7,
 };
 
 }  // namespace kest::tool

@@ -4,6 +4,8 @@
 #include <cstdint>
 #include <cstring>
 
+#include "ValueListCodec.h"
+
 namespace kest {
 namespace detail {
 
@@ -50,9 +52,10 @@ CComBSTR ElementText(const IXMLDOMNodePtr& element) {
 }
 
 void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const OLECHAR* name, BSTR value) {
-    IXMLDOMAttributePtr attribute = doc->createAttribute(_bstr_t(name));
-    attribute->PutnodeValue(_variant_t(_bstr_t(BstrView(value))));
+                  const _bstr_t& name, BSTR value) {
+    IXMLDOMAttributePtr attribute = doc->createAttribute(name);
+    const LentText text(value);
+    attribute->PutnodeValue(text.Get());
     attributes->setNamedItem(attribute);
 }
 

@@ -40,9 +40,10 @@ CComBSTR TextOf(const IXMLDOMNodePtr& node);
 /// children. A child without text (a nested element) throws _com_error.
 CComBSTR ElementText(const IXMLDOMNodePtr& element);
 
-/// Creates the attribute `name` with `value` (null gives empty text) and adds it to the map.
+/// Creates the attribute `name` with `value` (null gives empty text) and adds it to the map. The
+/// value is lent to the DOM, which copies it. The one attribute writer of the model.
 void AddAttribute(IXMLDOMDocument* doc, const IXMLDOMNamedNodeMapPtr& attributes,
-                  const OLECHAR* name, BSTR value);
+                  const _bstr_t& name, BSTR value);
 
 }  // namespace detail
 }  // namespace kest

@@ -299,7 +299,12 @@ bool FormatScaled(double magnitude, bool negative, char*& out) noexcept {
 
 }  // namespace
 
-char* FormatDouble(double value, char* buffer) noexcept {
+namespace {
+
+// FormatDouble; `readsBack` tells whether the text is known to read back as the value (the
+// whole-number and scaled paths check that as they go; the rounded shortest digits may not).
+char* FormatDouble15(double value, char* buffer, bool& readsBack) noexcept {
+    readsBack = true;
     const double magnitude = std::fabs(value);
     if (magnitude < 1e15 && value == std::trunc(value) && !(value == 0.0 && std::signbit(value))) {
         // Whole numbers below 10^15 (axis points, counts) are written by "%.15g" as the plain
@@ -314,6 +319,7 @@ char* FormatDouble(double value, char* buffer) noexcept {
             std::memcpy(buffer, "-0", 2);
             return buffer + 2;
         }
+        readsBack = false;
         return FormatDoubleExact(value, buffer);
     }
     const bool negative = std::signbit(value);
@@ -346,6 +352,7 @@ char* FormatDouble(double value, char* buffer) noexcept {
     if (negativeExponent) exponent = -exponent;
 
     if (count > kPrecision) {
+        readsBack = false;
         if (count == kPrecision + 1 && digits[kPrecision] == '5')
             return FormatDoubleExact(value, buffer);  // a tie in the digits; the binary decides
         const bool up = digits[kPrecision] >= '5';
@@ -363,6 +370,13 @@ char* FormatDouble(double value, char* buffer) noexcept {
     }
     while (count > 1 && digits[count - 1] == '0') --count;
     return WriteGeneral(buffer, negative, digits, count, exponent);
+}
+
+}  // namespace
+
+char* FormatDouble(double value, char* buffer) noexcept {
+    bool readsBack;
+    return FormatDouble15(value, buffer, readsBack);
 }
 
 namespace {
@@ -394,9 +408,10 @@ bool SameDouble(double a, double b) noexcept {
 }  // namespace
 
 char* WriteDouble(double value, char* buffer) noexcept {
-    char* last = FormatDouble(value, buffer);
+    bool readsBack;
+    char* last = FormatDouble15(value, buffer, readsBack);
     if (!std::isfinite(value)) return last;  // "inf", "-inf", "nan", "-nan": read back by name
-    if (!SameDouble(ParseDouble(buffer, last), value)) {
+    if (!readsBack && !SameDouble(ParseDouble(buffer, last), value)) {
         char digits[20];
         int exponent = 0;
         const int count = ShortestDigits(std::fabs(value), digits, exponent);

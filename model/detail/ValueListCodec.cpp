@@ -1,6 +1,6 @@
 #include "ValueListCodec.h"
 
-#include "ReadWarnings.h"
+#include "../KestCdfReadWarnings.h"
 
 #include <locale.h>
 #include <stdlib.h>
@@ -89,35 +89,7 @@ class TextBuilder {
         } else {
             // At most three bytes per unit (a pair of units takes four).
             if (text.size() > SIZE_MAX / 3) throw _com_error(E_OUTOFMEMORY);
-            char* o = Reserve(3 * text.size());
-            const char16_t* p = text.data();
-            const char16_t* const end = p + text.size();
-            while (p < end) {
-                std::uint32_t code = *p++;
-                if (code < 0x80) {
-                    *o++ = static_cast<char>(code);
-                    continue;
-                }
-                if (code >= 0xD800 && code <= 0xDFFF) {
-                    if (code <= 0xDBFF && p < end && *p >= 0xDC00 && *p <= 0xDFFF) {
-                        code = 0x10000 + ((code - 0xD800) << 10) + (*p++ - 0xDC00u);
-                        *o++ = static_cast<char>(0xF0 | (code >> 18));
-                        *o++ = static_cast<char>(0x80 | ((code >> 12) & 0x3F));
-                        *o++ = static_cast<char>(0x80 | ((code >> 6) & 0x3F));
-                        *o++ = static_cast<char>(0x80 | (code & 0x3F));
-                        continue;
-                    }
-                    code = 0xFFFD;
-                }
-                if (code < 0x800) {
-                    *o++ = static_cast<char>(0xC0 | (code >> 6));
-                } else {
-                    *o++ = static_cast<char>(0xE0 | (code >> 12));
-                    *o++ = static_cast<char>(0x80 | ((code >> 6) & 0x3F));
-                }
-                *o++ = static_cast<char>(0x80 | (code & 0x3F));
-            }
-            m_end = o;
+            m_end = Utf16ToUtf8(text, Reserve(3 * text.size()));
         }
     }
     void AppendAscii(const char* first, const char* last) {

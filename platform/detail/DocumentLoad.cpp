@@ -251,7 +251,11 @@ VARIANT_BOOL LoadFromFile(DomDocument& doc, const std::string& path, const std::
                 return FailLoad(doc, ReadFailure(readError, url, 0));
             // Entities are declared in a document type only; such a document is parsed in full
             // first, so that the parser's entity limits hold before the validator reads it.
-            if (head.hasDoctype) return LoadFromBytes(doc, bytes, nullptr, url, baseUrl);
+            if (head.hasDoctype) {
+                if (!LoadFromBytes(doc, bytes, nullptr, url, baseUrl)) return VARIANT_FALSE;
+                RememberLoadedFile(doc, path);
+                return VARIANT_TRUE;
+            }
             ValidationOutcome outcome =
                 ValidateDocument(bytes, refs, RequestFor(doc, url, baseUrl));
             if (Failed(outcome)) {

@@ -103,7 +103,16 @@ struct DomNode {
     void SetTextStorage(const char* data, std::uint32_t length) noexcept {
         m_text.data = data;
         m_text.length = length;
+        m_text.line = m_text.column = 0;
     }
+    // Where a loaded text node starts in its file (1-based); 0 when unknown or changed since.
+    // It takes room the links leave free in the union: no node grows.
+    void SetTextPosition(std::uint32_t line, std::uint32_t column) noexcept {
+        m_text.line = line;
+        m_text.column = column;
+    }
+    std::uint32_t TextLine() const noexcept { return IsContainer() ? 0 : m_text.line; }
+    std::uint32_t TextColumn() const noexcept { return IsContainer() ? 0 : m_text.column; }
 
   private:
     struct Links {
@@ -114,6 +123,8 @@ struct DomNode {
     struct TextSpan {
         const char* data;
         std::uint32_t length;
+        std::uint32_t line;
+        std::uint32_t column;
     };
     union {
         Links m_links;
@@ -173,8 +184,8 @@ struct DomDocument {
     std::string schemaPath;              // "SchemaPath": validate against this schema instead
     bool builtinSchemaFallback = false;  // "BuiltinSchemaFallback"
     bool usedBuiltinSchema = false;      // "UsedBuiltinSchema": the last load or validation did
-    long maxElementDepth = 0;  // 0: kDefaultMaxElementDepth
-    bool indent = false;       // save writes one element per line
+    long maxElementDepth = 0;            // 0: kDefaultMaxElementDepth
+    bool indent = false;                 // save writes one element per line
     ComPtr<IXMLDOMSchemaCollection> schemas;
     DomError error;
     std::string url;  // where the current content was loaded from

@@ -10,6 +10,18 @@ namespace {
 bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\r' || c == '\n'; }
 }  // namespace
 
+bool IsUtf8EncodingName(std::string_view name) noexcept {
+    constexpr std::string_view kDashed = "utf-8";
+    constexpr std::string_view kPlain = "utf8";
+    if (name.size() != kDashed.size() && name.size() != kPlain.size()) return false;
+    const std::string_view expected = name.size() == kDashed.size() ? kDashed : kPlain;
+    for (std::size_t i = 0; i < name.size(); ++i) {
+        char c = name[i] >= 'A' && name[i] <= 'Z' ? static_cast<char>(name[i] + 32) : name[i];
+        if (c != expected[i]) return false;
+    }
+    return true;
+}
+
 bool IsXmlName(std::string_view name) noexcept {
     if (name.empty()) return false;
     unsigned char first = static_cast<unsigned char>(name[0]);

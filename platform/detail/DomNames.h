@@ -13,6 +13,9 @@ namespace detail {
 /// starting with a digit, '-', '.' or ':'. Characters beyond ASCII are accepted as they are.
 bool IsXmlName(std::string_view name) noexcept;
 
+/// True for an encoding name that means UTF-8 ("UTF-8" or "UTF8", in any case).
+bool IsUtf8EncodingName(std::string_view name) noexcept;
+
 /// The declaration's value as text: `version="1.0" encoding="UTF-8"`.
 std::string DeclarationText(const DomNode* declaration);
 

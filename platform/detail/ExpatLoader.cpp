@@ -11,6 +11,8 @@
 #include <new>
 #include <vector>
 
+#include "DomNames.h"
+
 namespace kest {
 namespace detail {
 
@@ -32,8 +34,10 @@ struct Builder {
     bool rootOnly = false;  // stop once the root element's start tag is built
     bool rootSeen = false;
     bool hasDoctype = false;
+    std::vector<std::string> declaredEntities;  // general entities of the internal subset
     bool dropBlanksBesideElements = false;
-    std::string text;  // character data not yet turned into a node
+    std::string text;                            // character data not yet turned into a node
+    std::uint32_t textLine = 0, textColumn = 0;  // where `text` starts
     // Names repeat throughout a document: a small direct-mapped cache in front of the store's
     // table spares the key building and hashing of most lookups.
     const DomName* nameCache[512] = {};
@@ -108,17 +112,11 @@ struct Builder {
         } else {
             store->SetText(node, text);
         }
+        node->SetTextPosition(textLine, textColumn);
         LinkChild(current, node);
         text.clear();
     }
 };
-
-bool IsUtf8Label(const char* name) {
-    std::string lower;
-    for (const char* p = name; *p; ++p)
-        lower += static_cast<char>(*p >= 'A' && *p <= 'Z' ? *p + 32 : *p);
-    return lower == "utf-8" || lower == "utf8";
-}
 
 template <class F>
 void Guard(void* data, F&& body) {
@@ -133,8 +131,47 @@ void Guard(void* data, F&& body) {
     }
 }
 
+// expat drops a reference to an undeclared entity in an attribute value without a word when the
+// document has a DTD it does not read; the raw start tag shows such a reference.
+std::string UndeclaredEntityInTag(const Builder& b) {
+    int offset = 0, size = 0;
+    const char* context = XML_GetInputContext(b.parser, &offset, &size);
+    int length = XML_GetCurrentByteCount(b.parser);
+    if (!context || length <= 0 || offset + length > size) return {};
+    std::string_view tag(context + offset, static_cast<std::size_t>(length));
+    if (tag.find('\0') != std::string_view::npos) return {};  // UTF-16: expat decides alone
+    for (std::size_t amp = tag.find('&'); amp != std::string_view::npos;
+         amp = tag.find('&', amp + 1)) {
+        std::size_t end = tag.find(';', amp);
+        if (end == std::string_view::npos) break;
+        std::string name(tag.substr(amp + 1, end - amp - 1));
+        if (name.empty() || name[0] == '#' || name == "amp" || name == "lt" || name == "gt" ||
+            name == "apos" || name == "quot")
+            continue;
+        if (std::find(b.declaredEntities.begin(), b.declaredEntities.end(), name) ==
+            b.declaredEntities.end())
+            return name;
+    }
+    return {};
+}
+
+void XMLCALL OnEntityDecl(void* data, const XML_Char* name, int parameterEntity, const XML_Char*,
+                          int, const XML_Char*, const XML_Char*, const XML_Char*, const XML_Char*) {
+    Guard(data, [&](Builder& b) {
+        if (!parameterEntity) b.declaredEntities.emplace_back(name);
+    });
+}
+
 void XMLCALL OnStart(void* data, const XML_Char* name, const XML_Char** atts) {
     Guard(data, [&](Builder& b) {
+        if (b.hasDoctype && atts[0]) {
+            std::string entity = UndeclaredEntityInTag(b);
+            if (!entity.empty()) {
+                b.Stop("reference to entity '" + entity +
+                       "', which is not declared in the document and is never loaded");
+                return;
+            }
+        }
         b.FlushAtTag(true);
         if (++b.depth > b.maxDepth) {
             b.Stop("element nesting deeper than " + std::to_string(b.maxDepth));
@@ -171,7 +208,13 @@ void XMLCALL OnEnd(void* data, const XML_Char*) {
 }
 
 void XMLCALL OnCharacters(void* data, const XML_Char* s, int len) {
-    Guard(data, [&](Builder& b) { b.text.append(s, static_cast<std::size_t>(len)); });
+    Guard(data, [&](Builder& b) {
+        if (b.text.empty()) {
+            b.textLine = static_cast<std::uint32_t>(XML_GetCurrentLineNumber(b.parser));
+            b.textColumn = static_cast<std::uint32_t>(XML_GetCurrentColumnNumber(b.parser)) + 1;
+        }
+        b.text.append(s, static_cast<std::size_t>(len));
+    });
 }
 
 void XMLCALL OnCdataStart(void* data) {
@@ -185,6 +228,7 @@ void XMLCALL OnCdataEnd(void* data) {
     Guard(data, [&](Builder& b) {
         DomNode* node = b.store->NewNode(NODE_CDATA_SECTION);
         b.store->SetText(node, b.text);
+        node->SetTextPosition(b.textLine, b.textColumn);
         b.text.clear();
         LinkChild(b.current, node);
         b.inCdata = false;
@@ -216,7 +260,7 @@ void XMLCALL OnXmlDecl(void* data, const XML_Char* version, const XML_Char* enco
                        int standalone) {
     Guard(data, [&](Builder& b) {
         if (!version || b.current != b.top) return;  // a text declaration of an entity
-        if (b.utf8Bom && encoding && !IsUtf8Label(encoding)) {
+        if (b.utf8Bom && encoding && !IsUtf8EncodingName(encoding)) {
             // expat lets the mark win silently; the document contradicts itself, so refuse it.
             b.Stop(std::string("encoding \"") + encoding +
                    "\" declared after a UTF-8 byte order mark");
@@ -409,9 +453,9 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
                        bool preserveWhiteSpace) noexcept {
     ParsedContent result;
     error = DomError();
-    error.url = url;
     XML_Parser parser = nullptr;
     try {
+        error.url = url;
         result.store = std::make_unique<DomStore>();
         result.top = result.store->NewNode(NODE_DOCUMENT);
         parser = XML_ParserCreate(forcedEncoding);
@@ -436,6 +480,7 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
         // nothing outside the given bytes is ever read.
         XML_SetParamEntityParsing(parser, XML_PARAM_ENTITY_PARSING_NEVER);
         XML_SetSkippedEntityHandler(parser, OnSkippedEntity);
+        XML_SetEntityDeclHandler(parser, OnEntityDecl);
         XML_SetExternalEntityRefHandler(parser, OnExternalEntity);
 
         XML_Status status = XML_STATUS_OK;
@@ -492,8 +537,12 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
     } catch (...) {
         if (parser) XML_ParserFree(parser);
         error.code = E_OUTOFMEMORY;
-        error.reason = "out of memory while loading";
-        if (!url.empty()) error.reason += " " + url;
+        // Short of memory, the reason may be all that can be said.
+        try {
+            error.reason = "out of memory while loading";
+            if (!url.empty()) error.reason += " " + url;
+        } catch (...) {
+        }
         return ParsedContent();
     }
 }

@@ -7,6 +7,7 @@
 #include <libxml/xmlreader.h>
 
 #include <algorithm>
+#include <climits>
 #include <cstring>
 
 #include "LibxmlSupport.h"
@@ -33,6 +34,47 @@ int ReadFromMemory(void* context, char* buffer, int length) {
 
 int CloseMemory(void*) { return 0; }
 
+// The streaming validator gathers a text by appending each piece the parser hands it to what it
+// has, measuring that anew each time: quadratic in the length of one text. A document holding a
+// text this long is validated as a tree instead, which costs memory but grows linearly.
+constexpr std::size_t kLongestStreamedText = std::size_t(1) << 20;
+
+bool HasLongText(std::string_view document) {
+    std::size_t previous = 0;
+    while (previous < document.size()) {
+        std::size_t next = document.find('<', previous);
+        if (next == std::string_view::npos) next = document.size();
+        if (next - previous > kLongestStreamedText) return true;
+        previous = next + 1;
+    }
+    return false;
+}
+
+/// Validates as a tree; the parser's errors and the validator's go to `errors`.
+void ValidateAsTree(xmlSchemaValidCtxtPtr validator, std::string_view document,
+                    const std::string& documentUrl, ErrorCollector& errors) {
+    xmlParserCtxtPtr parser = xmlNewParserCtxt();
+    if (!parser) {
+        errors.has = true;
+        errors.message = "out of memory while preparing validation";
+        return;
+    }
+    xmlDocPtr tree = xmlCtxtReadMemory(parser, document.data(), static_cast<int>(document.size()),
+                                       documentUrl.empty() ? nullptr : documentUrl.c_str(), nullptr,
+                                       XML_PARSE_NONET | XML_PARSE_HUGE | XML_PARSE_BIG_LINES);
+    if (tree && !errors.has && xmlSchemaValidateDoc(validator, tree) != 0 && !errors.has) {
+        errors.has = true;
+        errors.message = "the document is not valid against its schema";
+    }
+    if (!tree && !errors.has) {
+        errors.has = true;
+        errors.domain = XML_FROM_PARSER;
+        errors.message = "the document cannot be read";
+    }
+    xmlFreeDoc(tree);
+    xmlFreeParserCtxt(parser);
+}
+
 ValidationOutcome Failure(const std::string& location, std::string reason) {
     ValidationOutcome outcome;
     outcome.code = XML_E_PARSEFAILED;
@@ -47,6 +89,20 @@ ValidationOutcome Offline(const std::string& location) {
         location, "schema location " + location + " requires the ServerHTTPRequest property");
     outcome.schemaUnavailable = true;
     outcome.offline = true;
+    return outcome;
+}
+
+ValidationOutcome Outcome(ValidationOutcome& outcome, const ErrorCollector& errors,
+                          const std::string& documentUrl) {
+    if (!errors.has) return outcome;
+    bool invalid = errors.domain == XML_FROM_SCHEMASV || errors.domain == XML_FROM_SCHEMASP ||
+                   errors.domain == XML_FROM_NONE;
+    outcome.code = invalid ? XML_E_INVALID : XML_E_PARSEFAILED;
+    outcome.reason = Located(errors, documentUrl);
+    outcome.what = errors.message;
+    outcome.line = errors.line;
+    outcome.column = errors.column;
+    if (!errors.file.empty()) outcome.url = errors.file;
     return outcome;
 }
 
@@ -73,6 +129,11 @@ ValidationOutcome ValidateWithSchema(const CompiledSchema& schema, std::string_v
         return outcome;
     }
     xmlSchemaSetValidStructuredErrors(validator, CollectError, &errors);
+    if (HasLongText(document) && document.size() < static_cast<std::size_t>(INT_MAX)) {
+        ValidateAsTree(validator, document, documentUrl, errors);
+        xmlSchemaFreeValidCtxt(validator);
+        return Outcome(outcome, errors, documentUrl);
+    }
     MemoryCursor cursor{document, 0};
     // No entity substitution, no DTD loading, no network: the loader refuses the rest. Texts
     // may be as long as the document: a value list of many megabytes is one text node. Every
@@ -107,17 +168,7 @@ ValidationOutcome ValidateWithSchema(const CompiledSchema& schema, std::string_v
     }
     xmlFreeTextReader(reader);
     xmlSchemaFreeValidCtxt(validator);
-
-    if (!errors.has) return outcome;
-    bool invalid = errors.domain == XML_FROM_SCHEMASV || errors.domain == XML_FROM_SCHEMASP ||
-                   errors.domain == XML_FROM_NONE;
-    outcome.code = invalid ? XML_E_INVALID : XML_E_PARSEFAILED;
-    outcome.reason = Located(errors, documentUrl);
-    outcome.what = errors.message;
-    outcome.line = errors.line;
-    outcome.column = errors.column;
-    if (!errors.file.empty()) outcome.url = errors.file;
-    return outcome;
+    return Outcome(outcome, errors, documentUrl);
 }
 
 ValidationOutcome ValidateDocument(std::string_view document, const std::vector<SchemaRef>& refs,

@@ -2,6 +2,8 @@
 
 #include <vector>
 
+#include "DomNames.h"
+
 namespace kest {
 namespace detail {
 
@@ -9,38 +11,39 @@ namespace {
 
 constexpr std::string_view kXmlNamespace = "http://www.w3.org/XML/1998/namespace";
 
-// The first character met that XML 1.0 cannot carry (a control character, U+FFFE, U+FFFF),
-// or -1. Per thread, reset by WriteXml.
-thread_local long t_unrepresentable = -1;
-
-void NoteUnrepresentable(long codePoint) {
-    if (t_unrepresentable < 0) t_unrepresentable = codePoint;
-}
+// The text being written, with the first character met that XML 1.0 cannot carry (a control
+// character, U+FFFE, U+FFFF), or -1. One per WriteXml call, so concurrent writes stay apart.
+struct Output : std::string {
+    long unrepresentable = -1;
+    void NoteUnrepresentable(long codePoint) {
+        if (unrepresentable < 0) unrepresentable = codePoint;
+    }
+};
 
 // Notes a character XML 1.0 cannot carry in raw text (CDATA, comments, instructions).
-void CheckRaw(std::string_view text) {
+void CheckRaw(Output& out, std::string_view text) {
     for (std::size_t i = 0; i < text.size(); ++i) {
         unsigned char c = static_cast<unsigned char>(text[i]);
         if (c < 0x20 && c != '\t' && c != '\n' && c != '\r') {
-            NoteUnrepresentable(c);
+            out.NoteUnrepresentable(c);
         } else if (c == 0xEF && i + 2 < text.size() &&
                    static_cast<unsigned char>(text[i + 1]) == 0xBF &&
                    (static_cast<unsigned char>(text[i + 2]) & 0xFE) == 0xBE) {
-            NoteUnrepresentable(0xFFFE + (static_cast<unsigned char>(text[i + 2]) & 1));
+            out.NoteUnrepresentable(0xFFFE + (static_cast<unsigned char>(text[i + 2]) & 1));
         }
     }
 }
 
-void AppendCharRef(std::string& out, unsigned char c) {
-    NoteUnrepresentable(c);
+void AppendCharRef(Output& out, unsigned char c) {
+    out.NoteUnrepresentable(c);
     out += "&#";
     out += std::to_string(static_cast<unsigned>(c));
     out += ';';
 }
 
 // Writes text, escaping what must not appear raw. `attribute` selects the attribute rules.
-void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
-    if (text.find("\xEF\xBF") != std::string_view::npos) CheckRaw(text);  // U+FFFE, U+FFFF
+void AppendEscaped(Output& out, std::string_view text, bool attribute) {
+    if (text.find("\xEF\xBF") != std::string_view::npos) CheckRaw(out, text);  // U+FFFE, U+FFFF
     std::size_t run = 0;
     for (std::size_t i = 0; i < text.size(); ++i) {
         unsigned char c = static_cast<unsigned char>(text[i]);
@@ -83,7 +86,7 @@ void AppendEscaped(std::string& out, std::string_view text, bool attribute) {
     out.append(text.data() + run, text.size() - run);
 }
 
-void AppendAttribute(std::string& out, std::string_view name, std::string_view value) {
+void AppendAttribute(Output& out, std::string_view name, std::string_view value) {
     out += ' ';
     out += name;
     out += "=\"";
@@ -91,21 +94,21 @@ void AppendAttribute(std::string& out, std::string_view name, std::string_view v
     out += '"';
 }
 
-void AppendCdata(std::string& out, std::string_view text) {
+void AppendCdata(Output& out, std::string_view text) {
     // "]]>" cannot appear in a CDATA section and a CR in one reads back as LF. Splitting the
     // section would turn one value into several nodes; as escaped text it stays one value.
     if (text.find("]]>") != std::string_view::npos || text.find('\r') != std::string_view::npos) {
         AppendEscaped(out, text, false);
         return;
     }
-    CheckRaw(text);
+    CheckRaw(out, text);
     out += "<![CDATA[";
     out += text;
     out += "]]>";
 }
 
-void AppendComment(std::string& out, std::string_view text) {
-    CheckRaw(text);
+void AppendComment(Output& out, std::string_view text) {
+    CheckRaw(out, text);
     out += "<!--";
     for (std::size_t i = 0; i < text.size(); ++i) {
         out += text[i];
@@ -114,13 +117,7 @@ void AppendComment(std::string& out, std::string_view text) {
     out += "-->";
 }
 
-bool IsUtf8Name(std::string_view encoding) {
-    std::string lower;
-    for (char c : encoding) lower += static_cast<char>(c >= 'A' && c <= 'Z' ? c + 32 : c);
-    return lower == "utf-8" || lower == "utf8";
-}
-
-void AppendPI(std::string& out, const DomNode* node) {
+void AppendPI(Output& out, const DomNode* node) {
     out += "<?";
     out += node->Name();
     if (node->IsDeclaration()) {
@@ -128,7 +125,7 @@ void AppendPI(std::string& out, const DomNode* node) {
         AppendAttribute(out, "version", version ? version->Text() : "1.0");
         for (const DomNode* a = node->FirstAttribute(); a; a = a->next) {
             if (a == version) continue;
-            if (a->Name() == "encoding" && !IsUtf8Name(a->Text()))
+            if (a->Name() == "encoding" && !IsUtf8EncodingName(a->Text()))
                 AppendAttribute(out, "encoding", "UTF-8");
             else
                 AppendAttribute(out, a->Name(), a->Text());
@@ -137,7 +134,7 @@ void AppendPI(std::string& out, const DomNode* node) {
         return;
     }
     std::string_view data = node->Text();
-    CheckRaw(data);
+    CheckRaw(out, data);
     if (!data.empty()) out += ' ';
     std::size_t run = 0;
     for (std::size_t i = 0; i + 1 < data.size(); ++i) {
@@ -180,7 +177,7 @@ class Scope {
 };
 
 // Writes the start tag of `element`; returns the scope mark to restore at its end.
-std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scope) {
+std::size_t AppendStartTag(Output& out, const DomNode* element, Scope& scope) {
     std::size_t mark = scope.Mark();
     out += '<';
     out += element->Name();
@@ -212,7 +209,7 @@ std::size_t AppendStartTag(std::string& out, const DomNode* element, Scope& scop
     return mark;
 }
 
-void AppendLeaf(std::string& out, const DomNode* node) {
+void AppendLeaf(Output& out, const DomNode* node) {
     switch (node->Type()) {
         case NODE_TEXT:
             AppendEscaped(out, node->Text(), false);
@@ -248,12 +245,12 @@ bool HoldsElementsOnly(const DomNode* element) {
     return elements;
 }
 
-void AppendLineBreak(std::string& out, std::size_t depth) {
+void AppendLineBreak(Output& out, std::size_t depth) {
     out += '\n';
     out.append(depth * 2, ' ');
 }
 
-void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush, bool indent) {
+void AppendSubtree(Output& out, const DomNode* root, const XmlFlush& flush, bool indent) {
     Scope scope;
     std::vector<std::size_t> marks;
     std::vector<bool> indented;  // per open element: its children go on lines of their own
@@ -296,8 +293,9 @@ void AppendSubtree(std::string& out, const DomNode* root, const XmlFlush& flush,
 
 }  // namespace
 
-long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush, bool indent) {
-    t_unrepresentable = -1;
+long WriteXml(const DomNode* node, std::string& text, const XmlFlush& flush, bool indent) {
+    Output out;
+    out.swap(text);
     if (node->Type() != NODE_DOCUMENT) {
         AppendSubtree(out, node, flush, indent);
     } else {
@@ -310,7 +308,8 @@ long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush, bool
         flush(out);
         out.clear();
     }
-    return t_unrepresentable;
+    out.swap(text);
+    return out.unrepresentable;
 }
 
 }  // namespace detail

@@ -492,7 +492,8 @@ TEST(KestCdfValueListCodec, WritesElementsByEachClassRule) {
 
     _variant_t axis = FormatValueList(array, ElementWriting::kAxis, false);
     ASSERT_EQ(VT_BSTR, axis.vt);
-    EXPECT_EQ(u"1.0e+020 0.10000000149011612 -42 a b 0 7 -1", std::u16string(BstrView(axis.bstrVal)));
+    EXPECT_EQ(u"1.0e+020 0.10000000149011612 -42 a b 0 7 -1",
+              std::u16string(BstrView(axis.bstrVal)));
     _variant_t item = FormatValueList(array, ElementWriting::kCalItemValue, false);
     EXPECT_EQ(u"1.0e+020 0.1 -42 a b  7 True", std::u16string(BstrView(item.bstrVal)));
 }

@@ -3,6 +3,7 @@
 #include <arpa/inet.h>
 #include <fcntl.h>
 #include <netinet/in.h>
+#include <poll.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/socket.h>
@@ -152,6 +153,33 @@ SilentServer::~SilentServer() {
 }
 
 std::string SilentServer::Url(const std::string& file) const {
+    return "http://127.0.0.1:" + std::to_string(m_port) + "/" + file;
+}
+
+CannedHttpServer::CannedHttpServer(std::string response) : m_response(std::move(response)) {
+    m_socket = BindAnyLocalPort(m_port);
+    if (m_socket < 0 || ::listen(m_socket, 16) != 0) return;
+    m_thread = std::thread([this] {
+        pollfd waiting{m_socket, POLLIN, 0};
+        // Shutting the socket down (in the destructor) ends the poll.
+        while (::poll(&waiting, 1, -1) == 1 && !(waiting.revents & (POLLHUP | POLLERR))) {
+            int client = ::accept(m_socket, nullptr, nullptr);
+            if (client < 0) break;
+            char request[4096];
+            (void)::recv(client, request, sizeof request, 0);
+            (void)::send(client, m_response.data(), m_response.size(), MSG_NOSIGNAL);
+            ::close(client);
+        }
+    });
+}
+
+CannedHttpServer::~CannedHttpServer() {
+    ::shutdown(m_socket, SHUT_RDWR);
+    if (m_thread.joinable()) m_thread.join();
+    if (m_socket >= 0) ::close(m_socket);
+}
+
+std::string CannedHttpServer::Url(const std::string& file) const {
     return "http://127.0.0.1:" + std::to_string(m_port) + "/" + file;
 }
 

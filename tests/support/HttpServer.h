@@ -4,6 +4,7 @@
 #include <sys/types.h>
 
 #include <string>
+#include <thread>
 
 namespace kest {
 namespace test {
@@ -49,6 +50,24 @@ class SilentServer {
   private:
     int m_socket = -1;
     int m_port = 0;
+};
+
+/// Answers every request on 127.0.0.1 with the same raw response (status line, headers and
+/// body as given), from a thread, until destroyed.
+class CannedHttpServer {
+  public:
+    explicit CannedHttpServer(std::string response);
+    ~CannedHttpServer();
+    CannedHttpServer(const CannedHttpServer&) = delete;
+    CannedHttpServer& operator=(const CannedHttpServer&) = delete;
+
+    std::string Url(const std::string& file) const;
+
+  private:
+    std::string m_response;
+    int m_socket = -1;
+    int m_port = 0;
+    std::thread m_thread;
 };
 
 /// A port on 127.0.0.1 that was free a moment ago (0 when none could be found).

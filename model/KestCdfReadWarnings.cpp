@@ -1,4 +1,4 @@
-#include "ReadWarnings.h"
+#include "KestCdfReadWarnings.h"
 
 namespace kest {
 namespace detail {

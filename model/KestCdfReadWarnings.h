@@ -1,4 +1,6 @@
 #pragma once
+// Shared by the value list readers and the converter that hands the warnings to the host; not
+// installed.
 // Tokens of value lists that the reader took only in part, empty tokens and overflows, gathered
 // per read for the host: the numbers are still read by the atoi and atof rules, but a number
 // that silently changed is worth a word.
