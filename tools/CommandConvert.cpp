@@ -48,8 +48,8 @@ int RunConvert(const ConvertOptions& options) {
     KestCalmorph converter;
     KestCdfCalData data;
     int code = GuardedRun({options.in}, [&] {
-        ReadCdf(converter, options.in, options.read, data);
-        return kExitOk;
+        const std::size_t warnings = ReadCdf(converter, options.in, options.read, data);
+        return warnings > 0 && options.read.strict ? kExitConversion : kExitOk;
     });
     if (code != kExitOk) return code;
 
