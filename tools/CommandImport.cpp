@@ -31,8 +31,7 @@ struct ImportOptions {
 
 std::string ReadText(const std::string& file) {
     if (file == "-")
-        return std::string(std::istreambuf_iterator<char>(std::cin),
-                           std::istreambuf_iterator<char>());
+        return std::string(std::istreambuf_iterator<char>(std::cin), std::istreambuf_iterator<char>());
     std::ifstream in(file, std::ios::binary);
     std::string text;
     if (in) text.assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
@@ -51,9 +50,9 @@ int RunImport(const ImportOptions& options) {
             data = ops::ToCalData(ops::ImportJson(ReadText(options.file)));
         } catch (const ops::JsonImportError& error) {
             const std::string where = DisplayName(options.file);
-            throw ToolError(
-                kExitCannotLoad, where,
-                error.Path().empty() ? error.Reason() : error.Path() + ": " + error.Reason());
+            throw ToolError(kExitCannotLoad, where,
+                            error.Path().empty() ? error.Reason()
+                                                 : error.Path() + ": " + error.Reason());
         }
         return kExitOk;
     });

@@ -58,8 +58,8 @@ constexpr const char* kOverview =
 
 // Every command of the tool, in the order of the help text.
 constexpr Command (*kCommands[])(CLI::App&) = {
-    AddInfoCommand,   AddShowCommand,     AddConvertCommand,       AddExportCommand,
-    AddImportCommand, AddValidateCommand, AddSchemaLocationCommand};
+    AddInfoCommand,     AddShowCommand,   AddConvertCommand,         AddExportCommand,
+    AddImportCommand,   AddValidateCommand, AddSchemaLocationCommand};
 
 }  // namespace
 

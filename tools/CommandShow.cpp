@@ -35,8 +35,7 @@ int RunShow(const ShowOptions& options) {
             ReadCdf(converter, options.file, options.read, data);
             document = ops::FromCalData(data);
         }
-        const ops::ItemSelection selection =
-            ops::SelectItems(document, options.items, options.list);
+        const ops::ItemSelection selection = ops::SelectItems(document, options.items, options.list);
         if (!options.list.empty() && selection.items.empty() && options.items.empty()) {
             throw ToolError(kExitNotFound, DisplayName(options.file),
                             "no list named \"" + options.list + "\"");
