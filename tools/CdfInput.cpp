@@ -55,8 +55,8 @@ void ThrowLoadFailure(const std::string& argument, const IXMLDOMParseErrorPtr& e
         lead + error->GetreasonText().ToString(), helps ? hint : std::string());
 }
 
-void ReadCdf(KestCalmorph& converter, const std::string& argument, const ReadSettings& settings,
-             KestCdfCalData& data) {
+std::size_t ReadCdf(KestCalmorph& converter, const std::string& argument,
+                    const ReadSettings& settings, KestCdfCalData& data) {
     converter.SetReadOptions(ReadOptionsOf(settings));
     CComBSTR message;
     data = converter.ConvertXMLtoCPP(CComBSTR(argument), true, message);
@@ -79,6 +79,16 @@ void ReadCdf(KestCalmorph& converter, const std::string& argument, const ReadSet
                                               ") is not at hand; validated against the "
                                               "built-in cdf.xsd");
     }
+    for (const KestReadWarning& warning : converter.GetReadWarnings()) {
+        const std::string where = Where(DisplayName(argument), warning.line, warning.column);
+        ReportWarning(where, (warning.item.empty() ? "" : "item " + warning.item + ": ") +
+                                 "token \"" + warning.token + "\" read as " + warning.valueRead);
+    }
+    const std::size_t omitted = converter.GetReadWarningsOmitted();
+    if (omitted > 0) {
+        ReportWarning(DisplayName(argument), std::to_string(omitted) + " more such warnings");
+    }
+    return converter.GetReadWarnings().size() + omitted;
 }
 
 }  // namespace kest::tool

@@ -27,10 +27,11 @@ void AddReadOptions(CLI::App& command, ReadSettings& settings);
 KestReadOptions ReadOptionsOf(const ReadSettings& settings);
 
 /// Reads `argument` ("-": standard input) into `data` with `converter`, telling on standard
-/// error when the built-in schema served. Throws ToolError when the file does not load or holds
-/// no CAL-DATA, KestCalmorphDLLError when the converter refuses its content.
-void ReadCdf(KestCalmorph& converter, const std::string& argument, const ReadSettings& settings,
-             KestCdfCalData& data);
+/// error when the built-in schema served and each number not read whole. Returns the number of
+/// warnings. Throws ToolError when the file does not load or holds no CAL-DATA,
+/// KestCalmorphDLLError when the converter refuses its content.
+std::size_t ReadCdf(KestCalmorph& converter, const std::string& argument,
+                    const ReadSettings& settings, KestCdfCalData& data);
 
 /// Throws ToolError(`code`) for a failed load or validation of `argument`, its reason after
 /// `lead`.

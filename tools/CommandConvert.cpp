@@ -35,8 +35,7 @@ std::string WhyItWouldNotReadBack(const std::string& path, const ReadSettings& s
         if (error.code == 0) return message.ToString();
         return (error.line > 0 ? "line " + std::to_string(error.line) + ": " : "") + error.reason;
     } catch (const KestCalmorphDLLError& error) {
-        return "reason code " + std::to_string(error.GetReason()) + " (" +
-               ReasonMeaning(error.GetReason()) + ")";
+        return ReasonOf(error);
     } catch (const std::exception& error) {
         return error.what();
     }
@@ -49,8 +48,8 @@ int RunConvert(const ConvertOptions& options) {
     KestCalmorph converter;
     KestCdfCalData data;
     int code = GuardedRun({options.in}, [&] {
-        ReadCdf(converter, options.in, options.read, data);
-        return kExitOk;
+        const std::size_t warnings = ReadCdf(converter, options.in, options.read, data);
+        return warnings > 0 && options.read.strict ? kExitConversion : kExitOk;
     });
     if (code != kExitOk) return code;
 

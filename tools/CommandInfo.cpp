@@ -22,8 +22,8 @@ int RunInfo(const InfoOptions& options) {
     KestCalmorph converter;
     KestCdfCalData data;
     int code = GuardedRun({options.file}, [&] {
-        ReadCdf(converter, options.file, options.read, data);
-        return kExitOk;
+        const std::size_t warnings = ReadCdf(converter, options.file, options.read, data);
+        return warnings > 0 && options.read.strict ? kExitConversion : kExitOk;
     });
     if (code != kExitOk) return code;
     PrintInfo(options.file, data, options.items);

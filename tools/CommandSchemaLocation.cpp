@@ -30,9 +30,7 @@ int RunSchemaLocation(const std::string& file) {
                 throw ToolError(kExitNoSchema, DisplayName(file),
                                 "names no schema (no xsi:schemaLocation)");
             }
-            throw ToolError(kExitCannotLoad, DisplayName(file),
-                            "cannot load (reason code " + std::to_string(error.GetReason()) + ": " +
-                                ReasonMeaning(error.GetReason()) + ")");
+            throw ToolError(kExitCannotLoad, DisplayName(file), "cannot load: " + ReasonOf(error));
         }
         if (converter.GetLastLoadError().code != 0) {
             ThrowLoadFailure(file, converter.GetLastLoadError());

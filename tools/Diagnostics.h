@@ -5,6 +5,8 @@
 //   WHERE: note: TEXT
 //   hint: WHAT TO DO        (after an error, when there is something to do)
 
+#include <kest/calmorph.h>
+
 #include <string>
 
 namespace kest::tool {
@@ -15,12 +17,12 @@ std::string Where(const std::string& file, long line, long column);
 /// The name a message uses for an input or output path: "<stdin>" / "<stdout>" for "-".
 std::string DisplayName(const std::string& path, bool output = false);
 
+/// "reason code N (what it means)", with ` in item "NAME"` when the error names an item.
+std::string ReasonOf(const KestCalmorphDLLError& error);
+
 void ReportError(const std::string& where, const std::string& text,
                  const std::string& hint = std::string());
 void ReportWarning(const std::string& where, const std::string& text);
 void ReportNote(const std::string& where, const std::string& text);
-
-/// What a converter reason code means, in a few words.
-const char* ReasonMeaning(int code);
 
 }  // namespace kest::tool

@@ -12,14 +12,6 @@ namespace kest::tool {
 
 namespace {
 
-std::string ConversionText(const KestCalmorphDLLError& error) {
-    std::string text = "conversion error: reason code " + std::to_string(error.GetReason()) + " (" +
-                       ReasonMeaning(error.GetReason()) + ")";
-    std::string item = error.GetReasonString().ToString();
-    if (!item.empty()) text += " in item \"" + item + "\"";
-    return text;
-}
-
 // A description naming the staged path names the file the user asked for instead.
 std::string Unstaged(std::string text, const Subject& subject) {
     if (subject.stagedPath.empty()) return text;
@@ -41,7 +33,7 @@ int GuardedRun(const Subject& subject, const std::function<int()>& step) {
         ReportError(error.Where(), error.what(), error.Hint());
         return error.Code();
     } catch (const KestCalmorphDLLError& error) {
-        ReportError(where, ConversionText(error));
+        ReportError(where, "conversion error: " + ReasonOf(error));
         return kExitConversion;
     } catch (const _com_error& error) {
         // The description names the path and the system's reason; the failure code adds nothing

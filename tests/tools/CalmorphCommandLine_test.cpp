@@ -46,9 +46,15 @@ TEST(CalmorphCommandLine, CommandsAnswerAsTheirHelpSays) {
     dir.Write("remote.cdf", Root(kCdfNs, "xsi:schemaLocation", "http://127.0.0.1:9/cdf.xsd"));
     dir.Write("foreign.cdf", Root("urn:other", "xsi:schemaLocation", "nowhere.xsd"));
     dir.Write("invalid.cdf", Root(kCdfNs, "xsi:schemaLocation", "cdf.xsd", "<CHANGE-HISTORY/>"));
-    const std::vector<std::string> inputs = {"badschema.cdf",  "cdf.xsd",     "misspelled.cdf",
-                                             "notaschema.xsd", "sample.cdf",  "elsewhere.cdf",
-                                             "remote.cdf",     "foreign.cdf", "invalid.cdf"};
+    dir.Write("warned.cdf",
+              Root(kCdfNs, "xsi:schemaLocation", "cdf.xsd",
+                   "<CHANGE-HISTORY/><FILENAME>f</FILENAME><CAL-LIST><NAME>L</NAME><SYMBOLIC-FILE "
+                   "crc32=\"0x00000001\">s</SYMBOLIC-FILE><CAL-ITEM><NAME>Idle</NAME><VALUE "
+                   "sw-units-ref=\"-\" format-type=\"NUMERIC\">1 98O</VALUE></CAL-ITEM>"
+                   "</CAL-LIST>"));
+    const std::vector<std::string> inputs = {
+        "warned.cdf", "badschema.cdf", "cdf.xsd",    "misspelled.cdf", "notaschema.xsd",
+        "sample.cdf", "elsewhere.cdf", "remote.cdf", "foreign.cdf",    "invalid.cdf"};
     const std::string fallback = "note: the schema it names (nowhere.xsd) is not at hand; ";
     const Row rows[] = {
         {"--version", 0, {"calmorph " KEST_PROJECT_VERSION "\n"}, {}, {}},
@@ -88,6 +94,13 @@ TEST(CalmorphCommandLine, CommandsAnswerAsTheirHelpSays) {
          {}},
         {"info --no-validate foreign.cdf", 0, {"namespace: urn:other"}, {}, {}},
         {"convert --strict misspelled.cdf out.cdf", 4, {}, {"out.cdf: warning: "}, {}},
+        {"info warned.cdf",
+         0,
+         {"items: 1"},
+         {"warned.cdf:1:", ": warning: item Idle: token \"98O\" read as 98\n"},
+         {}},
+        {"info --strict warned.cdf", 4, {}, {"warning: item Idle"}, {}},
+        {"convert --strict warned.cdf out.cdf", 4, {}, {"warning: item Idle"}, {}},
     };
     for (const Row& row : rows) {
         SCOPED_TRACE(row.command);
