@@ -511,7 +511,7 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
 
         if (status != XML_STATUS_OK || !b.failure.empty()) {
             error.code = XML_E_PARSEFAILED;
-            std::string what;
+            std::string what, expected;
             if (!b.failure.empty()) {
                 what = b.failure;
                 error.line = b.failLine;
@@ -520,6 +520,9 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
             } else {
                 XML_Error code = XML_GetErrorCode(parser);
                 what = XML_ErrorString(code) ? XML_ErrorString(code) : "parse error";
+                if (code == XML_ERROR_TAG_MISMATCH && b.current && b.current != b.top &&
+                    b.current->Type() == NODE_ELEMENT && b.current->name)
+                    expected = "; expected </" + std::string(b.current->name->qname) + ">";
                 if (code == XML_ERROR_UNKNOWN_ENCODING || code == XML_ERROR_INCORRECT_ENCODING)
                     error.cause = DOM_CAUSE_UNKNOWN_ENCODING;
                 error.line = static_cast<long>(XML_GetCurrentLineNumber(parser));
@@ -527,7 +530,9 @@ ParsedContent ParseXml(XmlSource& source, const char* forcedEncoding, const std:
                 error.filepos = static_cast<long>(XML_GetCurrentByteIndex(parser));
             }
             error.reason = DescribeLocation(what, error.line, error.linepos, url);
-            error.what = what;
+            // The structured reason also names the element left open, which expat's text does
+            // not; the message keeps the parser's own words.
+            error.what = what + expected;
             error.srcText = source.LineAround(error.filepos);
             XML_ParserFree(parser);
             return ParsedContent();

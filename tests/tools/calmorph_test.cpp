@@ -137,7 +137,7 @@ TEST(Calmorph, FailuresExitWithTheirCodeAndNameTheFile) {
         {{"convert", "sample.cdf", ""}, 1, {"calmorph: "}, nullptr},
         {{"schema-location"}, 1, {"calmorph: "}, nullptr},
         // info
-        {{"info", "malformed.cdf"}, 2, {"malformed.cdf:2:14: error: mismatched tag"}, nullptr},
+        {{"info", "malformed.cdf"}, 2, {"malformed.cdf:2:14: error: mismatched tag; expected </FILENAME>\n"}, nullptr},
         {{"info", "invalid.cdf"}, 2, {"invalid.cdf:2: error: ", "NOTE"}, nullptr},
         {{"info", "missing.cdf"}, 2, {"missing.cdf: error: cannot open"}, nullptr},
         {{"info", "other.xml"}, 2, {"other.xml: error: no CAL-DATA element"}, nullptr},
