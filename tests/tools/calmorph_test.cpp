@@ -137,7 +137,10 @@ TEST(Calmorph, FailuresExitWithTheirCodeAndNameTheFile) {
         {{"convert", "sample.cdf", ""}, 1, {"calmorph: "}, nullptr},
         {{"schema-location"}, 1, {"calmorph: "}, nullptr},
         // info
-        {{"info", "malformed.cdf"}, 2, {"malformed.cdf:2:14: error: mismatched tag; expected </FILENAME>\n"}, nullptr},
+        {{"info", "malformed.cdf"},
+         2,
+         {"malformed.cdf:2:14: error: mismatched tag; expected </FILENAME>\n"},
+         nullptr},
         {{"info", "invalid.cdf"}, 2, {"invalid.cdf:2: error: ", "NOTE"}, nullptr},
         {{"info", "missing.cdf"}, 2, {"missing.cdf: error: cannot open"}, nullptr},
         {{"info", "other.xml"}, 2, {"other.xml: error: no CAL-DATA element"}, nullptr},
@@ -179,10 +182,7 @@ TEST(Calmorph, FailuresExitWithTheirCodeAndNameTheFile) {
          nullptr},
         // schema-location
         {{"schema-location", "sample.cdf"}, 0, {}, "cdf.xsd\n"},
-        {{"schema-location", "unnamed.cdf"},
-         6,
-         {"unnamed.cdf: error: names no schema"},
-         nullptr},
+        {{"schema-location", "unnamed.cdf"}, 6, {"unnamed.cdf: error: names no schema"}, nullptr},
         {{"schema-location", "malformed.cdf"}, 2, {"malformed.cdf:2:14: error: "}, nullptr},
     };
     for (const Row& row : rows) {
