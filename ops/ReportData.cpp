@@ -20,12 +20,24 @@ void AppendString(std::string& out, const std::string& text) {
     out += '"';
     for (unsigned char c : text) {
         switch (c) {
-            case '"': out += "\\\""; break;
-            case '\\': out += "\\\\"; break;
-            case '\n': out += "\\n"; break;
-            case '\r': out += "\\r"; break;
-            case '\t': out += "\\t"; break;
-            case '<': out += "\\u003c"; break;  // never "</script" or "<!--" inside the element
+            case '"':
+                out += "\\\"";
+                break;
+            case '\\':
+                out += "\\\\";
+                break;
+            case '\n':
+                out += "\\n";
+                break;
+            case '\r':
+                out += "\\r";
+                break;
+            case '\t':
+                out += "\\t";
+                break;
+            case '<':
+                out += "\\u003c";
+                break;  // never "</script" or "<!--" inside the element
             default:
                 if (c < 0x20) {
                     char buffer[8];
@@ -50,8 +62,12 @@ void AppendOptional(std::string& out, const std::optional<std::string>& text) {
 // stays a text.
 void AppendValue(std::string& out, const Value& value) {
     switch (value.GetKind()) {
-        case Value::Kind::kEmpty: out += "null"; break;
-        case Value::Kind::kString: AppendString(out, value.Text()); break;
+        case Value::Kind::kEmpty:
+            out += "null";
+            break;
+        case Value::Kind::kString:
+            AppendString(out, value.Text());
+            break;
         default:
             if (std::isfinite(value.Number())) {
                 out += FormatNumber(value.Number());
@@ -108,8 +124,8 @@ void AppendFileRef(std::string& out, bool& first, const std::string& list, const
     std::uint32_t actual = 0;
     if (!folder.empty())
         state = !FileCrc32(folder + BaseName(ref->name), actual) ? "missing"
-                : actual == ref->crc                              ? "match"
-                                                                  : "mismatch";
+                : actual == ref->crc                             ? "match"
+                                                                 : "mismatch";
     out += '[';
     AppendString(out, list);
     out += ",\"";
@@ -173,10 +189,16 @@ void AppendItem(std::string& out, std::size_t list, const Item& item, const std:
     }
     out += "],";
     Value bound = Value::Double(span.min);
-    if (span.min <= span.max) AppendValue(out, bound); else out += "null";
+    if (span.min <= span.max)
+        AppendValue(out, bound);
+    else
+        out += "null";
     out += ',';
     bound = Value::Double(span.max);
-    if (span.min <= span.max) AppendValue(out, bound); else out += "null";
+    if (span.min <= span.max)
+        AppendValue(out, bound);
+    else
+        out += "null";
     out += ",\"";
     out += state;
     out += "\",";
@@ -185,7 +207,10 @@ void AppendItem(std::string& out, std::size_t list, const Item& item, const std:
     out += ',';
     AppendAxes(out, item);
     out += ',';
-    if (layout.finding) AppendString(out, layout.finding->message); else out += "null";
+    if (layout.finding)
+        AppendString(out, layout.finding->message);
+    else
+        out += "null";
     if (old) {
         // Changed elements: every index whose value differs, or is on one side only.
         const auto& now = item.values.elements;
@@ -250,7 +275,10 @@ std::string ReportJson(const ReportSource& current, const ReportSource& old) {
     out += "{\"file\":";
     AppendString(out, BaseName(current.path));
     out += ",\"old\":";
-    if (old.document) AppendString(out, BaseName(old.path)); else out += "null";
+    if (old.document)
+        AppendString(out, BaseName(old.path));
+    else
+        out += "null";
     out += ",\"header\":[";
     AppendString(out, doc.fileName);
     out += ',';

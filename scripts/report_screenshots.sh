@@ -15,7 +15,7 @@ sed -e 's/>1200 980 850 780 760</>1150 980 850 780 760</' \
 shoot() {
   "$browser" --headless --no-sandbox --disable-gpu --disable-quic --no-first-run \
     --disable-background-networking --disable-component-update --disable-sync \
-    --user-data-dir="$work/profile" --hide-scrollbars --window-size=1280,820 \
+    --user-data-dir="$work/profile" --hide-scrollbars --window-size=1400,860 \
     --screenshot="$2" "file://$1" 2>/dev/null
 }
 shoot "$work/map.html#item=TorqueLimit" docs/images/report-map.png
