@@ -1,14 +1,14 @@
 #include "ReportData.h"
 
-#include <array>
 #include <cmath>
 #include <cstdio>
-#include <fstream>
 #include <limits>
 #include <unordered_map>
 #include <unordered_set>
 #include <vector>
 
+#include "Check.h"
+#include "Diff.h"
 #include "ValueLayout.h"
 
 namespace kest {
@@ -121,11 +121,10 @@ void AppendFileRef(std::string& out, bool& first, const std::string& list, const
     std::snprintf(crcText, sizeof crcText, "0x%08X", static_cast<unsigned>(ref->crc));
     std::string state;
     // A name that climbs out of the folder or names a path is looked up only by its last part.
-    std::uint32_t actual = 0;
-    if (!folder.empty())
-        state = !FileCrc32(folder + BaseName(ref->name), actual) ? "missing"
-                : actual == ref->crc                             ? "match"
-                                                                 : "mismatch";
+    std::string error;
+    const auto actual =
+        folder.empty() ? std::nullopt : FileCrc32(folder + BaseName(ref->name), error);
+    if (!folder.empty()) state = !actual ? "missing" : actual == ref->crc ? "match" : "mismatch";
     out += '[';
     AppendString(out, list);
     out += ",\"";
@@ -154,24 +153,8 @@ Span SpanOf(const std::vector<Value>& values) {
     return span;
 }
 
-bool SameAxes(const Item& a, const Item& b) {
-    if (a.axes.size() != b.axes.size()) return false;
-    for (std::size_t i = 0; i < a.axes.size(); ++i) {
-        const auto& pa = a.axes[i].points.elements;
-        const auto& pb = b.axes[i].points.elements;
-        if (pa.size() != pb.size() || a.axes[i].units != b.axes[i].units) return false;
-        for (std::size_t k = 0; k < pa.size(); ++k)
-            if (!pa[k].SameAs(pb[k])) return false;
-    }
-    return true;
-}
-
-struct ItemRef {
-    const Item* item;
-};
-
 void AppendItem(std::string& out, std::size_t list, const Item& item, const std::string& listName,
-                const char* state, const Item* old) {
+                const char* state, const Item* old = nullptr, const ItemDiff* diff = nullptr) {
     const ValueLayout layout = LayoutOf(item, listName);
     const Span span = SpanOf(item.values.elements);
     out += '[';
@@ -213,60 +196,23 @@ void AppendItem(std::string& out, std::size_t list, const Item& item, const std:
         out += "null";
     if (old) {
         // Changed elements: every index whose value differs, or is on one side only.
-        const auto& now = item.values.elements;
-        const auto& was = old->values.elements;
         out += ",[";
         bool first = true;
-        for (std::size_t k = 0; k < std::max(now.size(), was.size()); ++k) {
-            if (k < now.size() && k < was.size() && now[k].SameAs(was[k])) continue;
+        for (const ElementChange& change : diff->elements) {
+            if (change.part != "values") continue;
             if (!first) out += ',';
             first = false;
-            out += std::to_string(k);
+            out += std::to_string(change.index);
         }
         out += "],";
-        AppendValues(out, was);
+        AppendValues(out, old->values.elements);
         out += ',';
         AppendAxes(out, *old);
     }
     out += ']';
 }
 
-bool Changed(const Item& a, const Item& b) {
-    if (a.format != b.format || a.units != b.units || !SameAxes(a, b) ||
-        a.values.elements.size() != b.values.elements.size())
-        return true;
-    for (std::size_t k = 0; k < a.values.elements.size(); ++k)
-        if (!a.values.elements[k].SameAs(b.values.elements[k])) return true;
-    return false;
-}
-
 }  // namespace
-
-bool FileCrc32(const std::string& path, std::uint32_t& crc) {
-    static const auto table = [] {
-        std::array<std::uint32_t, 256> t{};
-        for (std::uint32_t n = 0; n < 256; ++n) {
-            std::uint32_t c = n;
-            for (int k = 0; k < 8; ++k) c = (c & 1) ? 0xEDB88320u ^ (c >> 1) : c >> 1;
-            t[n] = c;
-        }
-        return t;
-    }();
-    std::ifstream in(path, std::ios::binary);
-    if (!in) return false;
-    std::uint32_t c = 0xFFFFFFFFu;
-    std::vector<char> buffer(1 << 16);
-    while (in) {
-        in.read(buffer.data(), static_cast<std::streamsize>(buffer.size()));
-        const auto got = static_cast<std::size_t>(in.gcount());
-        for (std::size_t i = 0; i < got; ++i)
-            c = table[(c ^ static_cast<unsigned char>(buffer[i])) & 0xFFu] ^ (c >> 8);
-    }
-    // A directory opens on some systems but reads nothing and sets badbit.
-    if (in.bad()) return false;
-    crc = c ^ 0xFFFFFFFFu;
-    return true;
-}
 
 std::string ReportJson(const ReportSource& current, const ReportSource& old) {
     const Document& doc = *current.document;
@@ -312,8 +258,6 @@ std::string ReportJson(const ReportSource& current, const ReportSource& old) {
         AppendFileRef(out, first, name, "TARGET-IMAGE", list.targetImage, folder);
     }
 
-    // Items are matched by list and item name; a repeated name pairs in order of appearance.
-    std::unordered_map<std::string, std::vector<ItemRef>> oldItems;
     std::vector<std::string> listNames;
     auto indexOfList = [&](const std::string& name) {
         for (std::size_t i = 0; i < listNames.size(); ++i)
@@ -321,58 +265,64 @@ std::string ReportJson(const ReportSource& current, const ReportSource& old) {
         listNames.push_back(name);
         return listNames.size() - 1;
     };
-    auto keyOf = [](const std::string& list, const Item& item) {
-        return list + '\x1f' + item.name.value_or(std::string());
+    // Items pair as Diff pairs them: by list and item name, a repeated name in order.
+    DocumentDiff diff;
+    std::unordered_map<std::string, const ItemDiff*> changed;
+    std::unordered_set<std::string> added;
+    std::unordered_set<std::string> removed;
+    std::unordered_map<std::string, const Item*> oldItems;
+    auto keyOf = [](const ItemKey& key) {
+        return key.list + '\x1f' + key.item + '\x1f' + std::to_string(key.occurrence);
     };
-    if (old.document)
-        for (const CalList& list : old.document->lists)
-            for (const Item& item : list.items)
-                oldItems[keyOf(list.name.value_or(std::string()), item)].push_back({&item});
-    std::unordered_map<std::string, std::size_t> taken;
+    // Calls `visit(listIndex, listName, item, key)` for every item of `document`, in order.
+    auto forEachItem = [&](const Document& document, auto&& visit) {
+        std::unordered_map<std::string, std::size_t> seen;
+        for (const CalList& list : document.lists) {
+            const std::string name = list.name.value_or(std::string());
+            const std::size_t index = indexOfList(name);
+            for (const Item& item : list.items) {
+                ItemKey key{name, item.name.value_or(std::string()), 0};
+                key.occurrence = seen[name + '\x1f' + key.item]++;
+                visit(index, name, item, keyOf(key));
+            }
+        }
+    };
+    if (old.document) {
+        diff = Diff(*old.document, doc);
+        for (const ItemDiff& item : diff.changed) changed[keyOf(item.key)] = &item;
+        for (const ItemKey& key : diff.onlyInB) added.insert(keyOf(key));
+        for (const ItemKey& key : diff.onlyInA) removed.insert(keyOf(key));
+        std::vector<std::string> keepOrder = listNames;
+        forEachItem(*old.document, [&](std::size_t, const std::string&, const Item& item,
+                                       const std::string& key) { oldItems[key] = &item; });
+        listNames = keepOrder;  // lists are numbered in the order of the current file first
+    }
 
     out += "],\"items\":[";
     first = true;
-    for (const CalList& list : doc.lists) {
-        const std::string name = list.name.value_or(std::string());
-        const std::size_t index = indexOfList(name);
-        for (const Item& item : list.items) {
+    forEachItem(doc, [&](std::size_t index, const std::string& name, const Item& item,
+                         const std::string& key) {
+        if (!first) out += ',';
+        first = false;
+        const auto change = changed.find(key);
+        if (!old.document)
+            AppendItem(out, index, item, name, "");
+        else if (added.count(key))
+            AppendItem(out, index, item, name, "added");
+        else if (change != changed.end())
+            // Old values travel only with changed items: the page draws them under the new.
+            AppendItem(out, index, item, name, "changed", oldItems[key], change->second);
+        else
+            AppendItem(out, index, item, name, "same");
+    });
+    if (old.document)
+        forEachItem(*old.document, [&](std::size_t index, const std::string& name, const Item& item,
+                                       const std::string& key) {
+            if (!removed.count(key)) return;
             if (!first) out += ',';
             first = false;
-            if (!old.document) {
-                AppendItem(out, index, item, name, "", nullptr);
-                continue;
-            }
-            const std::string key = keyOf(name, item);
-            const auto found = oldItems.find(key);
-            std::size_t& next = taken[key];
-            if (found == oldItems.end() || next >= found->second.size()) {
-                AppendItem(out, index, item, name, "added", nullptr);
-                continue;
-            }
-            const Item& was = *found->second[next++].item;
-            // Old values travel only with changed items: the page draws them under the new.
-            if (Changed(item, was))
-                AppendItem(out, index, item, name, "changed", &was);
-            else
-                AppendItem(out, index, item, name, "same", nullptr);
-        }
-    }
-    if (old.document) {
-        // Old items past those paired with a current item were removed; listed in old order.
-        std::unordered_set<const Item*> removed;
-        for (const auto& entry : oldItems)
-            for (std::size_t i = taken[entry.first]; i < entry.second.size(); ++i)
-                removed.insert(entry.second[i].item);
-        for (const CalList& list : old.document->lists) {
-            const std::string name = list.name.value_or(std::string());
-            for (const Item& item : list.items) {
-                if (!removed.count(&item)) continue;
-                if (!first) out += ',';
-                first = false;
-                AppendItem(out, indexOfList(name), item, name, "removed", nullptr);
-            }
-        }
-    }
+            AppendItem(out, index, item, name, "removed");
+        });
     out += "],\"lists\":[";
     for (std::size_t i = 0; i < listNames.size(); ++i) {
         if (i) out += ',';

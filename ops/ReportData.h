@@ -9,7 +9,6 @@
 // The text is safe inside an HTML script element: every '<' is written as \u003c, so no name or
 // text can end the element or open markup.
 
-#include <cstdint>
 #include <string>
 
 #include "../platform/Export.h"
@@ -24,10 +23,6 @@ struct KEST_API ReportSource {
     const Document* document = nullptr;
     std::string path;
 };
-
-/// CRC-32 (IEEE 802.3, as zlib computes it) of a file, read in pieces; false when the file is
-/// missing, a directory or unreadable.
-KEST_API bool FileCrc32(const std::string& path, std::uint32_t& crc);
 
 /// The report data of `current`, compared with `old` when it holds a document.
 KEST_API std::string ReportJson(const ReportSource& current, const ReportSource& old = {});
