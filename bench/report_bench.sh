@@ -8,8 +8,8 @@ build=${1:-build/release}
 items=${KEST_BENCH_ITEMS:-60000}
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
-"$build/cdfgen" --items "$items" "$work/new.cdf" >/dev/null
-"$build/cdfgen" --items "$items" --seed 2 "$work/old.cdf" >/dev/null
+"$build/bench/cdfgen" --items "$items" "$work/new.cdf" >/dev/null
+"$build/bench/cdfgen" --items "$items" --seed 2 "$work/old.cdf" >/dev/null
 cp schema/cdf.xsd "$work/" 2>/dev/null || true
 seconds() { local s e; s=$(date +%s.%N); "$@" >/dev/null 2>&1; e=$(date +%s.%N); echo "$e - $s" | bc; }
 best() { local b=999 t; for _ in 1 2 3; do t=$(seconds "$@"); b=$(echo "if ($t < $b) $t else $b" | bc); done; echo "$b"; }
