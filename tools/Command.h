@@ -21,5 +21,6 @@ Command AddSchemaLocationCommand(CLI::App& calmorph);
 Command AddShowCommand(CLI::App& calmorph);
 Command AddExportCommand(CLI::App& calmorph);
 Command AddImportCommand(CLI::App& calmorph);
+Command AddReportCommand(CLI::App& calmorph);
 
 }  // namespace kest::tool

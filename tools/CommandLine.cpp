@@ -59,7 +59,7 @@ constexpr const char* kOverview =
 // Every command of the tool, in the order of the help text.
 constexpr Command (*kCommands[])(CLI::App&) = {
     AddInfoCommand,     AddShowCommand,   AddConvertCommand,         AddExportCommand,
-    AddImportCommand,   AddValidateCommand, AddSchemaLocationCommand};
+    AddImportCommand,   AddReportCommand,   AddValidateCommand,        AddSchemaLocationCommand};
 
 }  // namespace
 
