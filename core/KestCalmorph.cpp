@@ -4,6 +4,7 @@
 #include "KestCalmorph.h"
 
 #include "../model/KestCdfReadWarnings.h"
+#include "../platform/XmlFileWriter.h"
 
 #include <utility>
 #include <vector>
@@ -251,19 +252,14 @@ KestCdfCalData KestCalmorph::ConvertCPPToXML() { return KestCdfCalData(); }
 
 bool KestCalmorph::ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment) {
     m_calData = data;
-
-    IXMLDOMDocument2Ptr document;
-    HRESULT hr = document.CreateInstance(kProgIdDOMDocument40);
-    if (FAILED(hr)) throw hr;
-
-    WriteScope scope(m_writeDocument, m_currentNode);
-    m_writeDocument = document.GetInterfacePtr();
-    if (m_writeOptions.indent) document->setProperty(_bstr_t(u"Indent"), _variant_t(true));
-    CreateXMLEnvironment();
-    // The whole tree is built before anything is saved: a writer that refuses the tree throws
-    // here, and no file is touched.
-    m_calData.ConvertCalDataNodeToXML(m_writeDocument, std::move(comment));
-    return SaveDocument(std::move(outputPath));
+    // Written straight from the tree, with the bytes and checks of a document built and saved.
+    // The file is only renamed into place once the whole tree is written: a writer that refuses
+    // the tree throws, and the target is not touched.
+    XmlFileWriter out(outputPath.ToString(), m_writeOptions.indent);
+    m_calData.WriteXmlText(out, comment);
+    if (outputPath.Length() == 0) return false;
+    out.Commit();
+    return true;
 }
 
 void KestCalmorph::CreateXMLEnvironment() {
