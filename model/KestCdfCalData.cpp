@@ -189,7 +189,8 @@ void KestCdfCalData::WriteXmlText(XmlFileWriter& out, const CComBSTR& comment) {
     if (comment.Length() != 0) out.Comment(comment.View());
     m_changeHistory.WriteXmlText(out);
     detail::WriteTextElement(out, u"FILENAME", m_fileName.m_string);
-    if (m_company.m_string != nullptr) detail::WriteTextElement(out, u"COMPANY-INFO", m_company.m_string);
+    if (m_company.m_string != nullptr)
+        detail::WriteTextElement(out, u"COMPANY-INFO", m_company.m_string);
     if (m_note != nullptr) detail::WriteTextElement(out, u"NOTE", m_note);
     out.Attribute(u"xmlns", BstrView(m_namespace.m_string));
     if (m_schemaInstance.m_string == nullptr) {
