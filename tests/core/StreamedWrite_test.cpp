@@ -108,6 +108,16 @@ TEST(StreamedWrite, RefusesAsTheBuiltDocumentDoes) {
     CComBSTR message;
     const KestCdfCalData sample = reader.ConvertXMLtoCPP(
         CComBSTR(std::string(KEST_SOURCE_DIR) + "/examples/sample.cdf"), true, message);
+    KestCdfCalData control = sample;  // a character no XML 1.0 file can hold
+    control.SetFileName(CComBSTR(u"a\x01b"));
+    KestCdfCalData marks = sample;
+    marks.SetNote(CComBSTR(u"<&>]]>\r\t\"'"));
+    // Megabytes reach the file before the last list turns out to have no name.
+    KestCdfCalData large = sample;
+    const int lists = 1000;
+    KestCdfCalList* const array = large.CreateCalList(lists);
+    for (int i = 0; i + 1 < lists; ++i) array[i] = sample.GetCalList();
+    large.SetCalListSize(lists);
     fs::create_directory(dir / "folder");
     test::WriteWholeFile(dir / "old.cdf", "old");
     const struct {
@@ -116,6 +126,8 @@ TEST(StreamedWrite, RefusesAsTheBuiltDocumentDoes) {
         std::string path;
     } cases[] = {
         {"empty tree", KestCdfCalData(), dir / "old.cdf"},
+        {"control character", control, dir / "old.cdf"},
+        {"large, refused at its end", large, dir / "old.cdf"},
         {"empty path", sample, ""},
         {"empty tree, empty path", KestCdfCalData(), ""},
         {"directory", sample, dir / "folder"},
@@ -129,4 +141,9 @@ TEST(StreamedWrite, RefusesAsTheBuiltDocumentDoes) {
         EXPECT_NE(dom.substr(0, 5), "saved");
     }
     EXPECT_EQ(test::ReadWholeFile(dir / "old.cdf"), "old");
+    EXPECT_EQ(std::distance(fs::directory_iterator(dir / ""), fs::directory_iterator()), 2);
+    // A comment of megabytes goes out before the root's attributes are known.
+    const std::u16string comment(1500000, u'c');
+    const std::string escaped = DomWrite(marks, dir / "marks.cdf", comment.c_str(), true);
+    EXPECT_EQ(StreamWrite(marks, dir / "marks.cdf", comment.c_str(), true), escaped);
 }
