@@ -69,21 +69,25 @@ XmlFileWriter::~XmlFileWriter() = default;
 void XmlFileWriter::StartElement(std::u16string_view name) {
     State& s = *m_state;
     s.BeforeChild(false);
-    s.out += '<';
-    s.out += Utf16ToUtf8(name);
     s.open.push_back({Utf16ToUtf8(name)});
+    s.out += '<';
+    s.out += s.open.back().name;
 }
 
 void XmlFileWriter::Attribute(std::u16string_view name, std::u16string_view value) {
     State& s = *m_state;
-    std::string text = " " + Utf16ToUtf8(name) + "=\"";
-    s.Note(detail::AppendEscapedText(text, Utf16ToUtf8(value), true));
-    text += '"';
+    const std::size_t start = s.out.size();
+    s.out += ' ';
+    s.out += Utf16ToUtf8(name);
+    s.out += "=\"";
+    s.Note(detail::AppendEscapedText(s.out, Utf16ToUtf8(value), true));
+    s.out += '"';
     if (s.held) {
+        // Moved into the held start tag, after the attributes it already has.
+        std::string text = s.out.substr(start);
+        s.out.resize(start);
         s.out.insert(s.heldAt, text);
         s.heldAt += text.size();
-    } else {
-        s.out += text;
     }
 }
 
