@@ -1,5 +1,5 @@
 // The converter object, the read pipeline (load, walk, convert CAL-DATA) and the write pipeline
-// (build a new document around the tree and save it).
+// (the tree written straight to the file).
 
 #include "KestCalmorph.h"
 
@@ -22,24 +22,6 @@ constexpr std::u16string_view kCalDataName = u"CAL-DATA";
 bool IsSkippedSubtree(const IXMLDOMNodePtr& node) {
     return node->NameIs(kSkippedChangeHistory) || node->NameIs(kSkippedCalItem);
 }
-
-// Clears the converter's write-document field and current node when a write ends, however it
-// ends, so that neither outlives the document of that call.
-class WriteScope {
-  public:
-    WriteScope(IXMLDOMDocument*& document, IXMLDOMNodePtr& currentNode) noexcept
-        : m_document(document), m_currentNode(currentNode) {}
-    ~WriteScope() {
-        m_document = nullptr;
-        m_currentNode = nullptr;
-    }
-    WriteScope(const WriteScope&) = delete;
-    WriteScope& operator=(const WriteScope&) = delete;
-
-  private:
-    IXMLDOMDocument*& m_document;
-    IXMLDOMNodePtr& m_currentNode;
-};
 
 }  // namespace
 
