@@ -20,6 +20,7 @@
 #include <cstdlib>
 #include <functional>
 #include <map>
+#include <memory>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -260,7 +261,8 @@ void BM_ReadValidated(benchmark::State& state) {
             [](Samples&) { return TimedRead(g.schemaFile, nullptr); });
 }
 
-void BM_Write(benchmark::State& state) {
+// The tree a validated read returns, read once; null (and the benchmark skipped) on failure.
+const KestCdfCalData* ReadTree(benchmark::State& state) {
     static KestCdfCalData tree;
     static bool haveTree = false;
     if (!haveTree) {
@@ -271,20 +273,59 @@ void BM_Write(benchmark::State& state) {
             state.SkipWithError(Describe(std::current_exception()).c_str());
             for (auto _ : state) {
             }
-            return;
+            return nullptr;
         }
     }
+    return &tree;
+}
+
+void BM_Write(benchmark::State& state) {
+    static const KestCdfCalData* tree = nullptr;
+    if (!(tree = ReadTree(state))) return;
     Measure(state, "write", "ConvertCPPToXML of the read tree", g.schemaFile, g.schemaBytes, 2.0,
             [](Samples&) {
                 KestCalmorph converter;
                 const Stopwatch watch;
                 const bool ok =
-                    converter.ConvertCPPToXML(tree, CComBSTR(g.writeOut), CComBSTR(u""));
+                    converter.ConvertCPPToXML(*tree, CComBSTR(g.writeOut), CComBSTR(u""));
                 const Lap lap = watch.Stop();
                 if (!ok) throw std::runtime_error("ConvertCPPToXML returned false");
                 return lap;
             });
     state.counters["out_bytes"] = static_cast<double>(FileSize(g.writeOut));
+}
+
+// The write as a document built from the tree and saved, which hosts holding a DOM still use.
+void BM_WriteDom(benchmark::State& state) {
+    static const KestCdfCalData* tree = nullptr;
+    if (!(tree = ReadTree(state))) return;
+    Measure(state, "write_dom", "document built from the tree, saved", g.schemaFile, g.schemaBytes,
+            0, [](Samples&) {
+                KestCdfCalData copy = *tree;
+                const Stopwatch watch;
+                IXMLDOMDocument2Ptr doc;
+                if (FAILED(doc.CreateInstance(kProgIdDOMDocument40)))
+                    throw std::runtime_error("no document");
+                doc->appendChild(
+                    doc->createNode(_variant_t(static_cast<int>(NODE_PROCESSING_INSTRUCTION)),
+                                    _bstr_t(u"xml"), _bstr_t(u"")));
+                copy.ConvertCalDataNodeToXML(doc.GetInterfacePtr(), CComBSTR(u""));
+                doc->save(_variant_t(CComBSTR(g.writeOut).m_str));
+                doc = nullptr;
+                return watch.Stop();
+            });
+}
+
+// Freeing a tree a read returned (the read itself is not timed).
+void BM_FreeTree(benchmark::State& state) {
+    Measure(state, "free", "freeing the tree of a read", g.plainFile, g.plainBytes, 0,
+            [](Samples&) {
+                auto tree = std::make_unique<KestCdfCalData>();
+                TimedRead(g.plainFile, tree.get());
+                const Stopwatch watch;
+                tree.reset();
+                return watch.Stop();
+            });
 }
 
 void PrepareFiles() {
@@ -384,6 +425,8 @@ int main(int argc, char** argv) {
     add("ReadNoSchema", BM_ReadNoSchema);
     add("ReadValidated", BM_ReadValidated);
     add("Write", BM_Write);
+    add("WriteDom", BM_WriteDom);
+    add("FreeTree", BM_FreeTree);
     benchmark::RunSpecifiedBenchmarks();
     benchmark::Shutdown();
     PrintSummary();

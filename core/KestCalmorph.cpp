@@ -1,9 +1,10 @@
 // The converter object, the read pipeline (load, walk, convert CAL-DATA) and the write pipeline
-// (build a new document around the tree and save it).
+// (the tree written straight to the file).
 
 #include "KestCalmorph.h"
 
 #include "../model/KestCdfReadWarnings.h"
+#include "../platform/XmlFileWriter.h"
 
 #include <utility>
 #include <vector>
@@ -21,24 +22,6 @@ constexpr std::u16string_view kCalDataName = u"CAL-DATA";
 bool IsSkippedSubtree(const IXMLDOMNodePtr& node) {
     return node->NameIs(kSkippedChangeHistory) || node->NameIs(kSkippedCalItem);
 }
-
-// Clears the converter's write-document field and current node when a write ends, however it
-// ends, so that neither outlives the document of that call.
-class WriteScope {
-  public:
-    WriteScope(IXMLDOMDocument*& document, IXMLDOMNodePtr& currentNode) noexcept
-        : m_document(document), m_currentNode(currentNode) {}
-    ~WriteScope() {
-        m_document = nullptr;
-        m_currentNode = nullptr;
-    }
-    WriteScope(const WriteScope&) = delete;
-    WriteScope& operator=(const WriteScope&) = delete;
-
-  private:
-    IXMLDOMDocument*& m_document;
-    IXMLDOMNodePtr& m_currentNode;
-};
 
 }  // namespace
 
@@ -251,19 +234,14 @@ KestCdfCalData KestCalmorph::ConvertCPPToXML() { return KestCdfCalData(); }
 
 bool KestCalmorph::ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment) {
     m_calData = data;
-
-    IXMLDOMDocument2Ptr document;
-    HRESULT hr = document.CreateInstance(kProgIdDOMDocument40);
-    if (FAILED(hr)) throw hr;
-
-    WriteScope scope(m_writeDocument, m_currentNode);
-    m_writeDocument = document.GetInterfacePtr();
-    if (m_writeOptions.indent) document->setProperty(_bstr_t(u"Indent"), _variant_t(true));
-    CreateXMLEnvironment();
-    // The whole tree is built before anything is saved: a writer that refuses the tree throws
-    // here, and no file is touched.
-    m_calData.ConvertCalDataNodeToXML(m_writeDocument, std::move(comment));
-    return SaveDocument(std::move(outputPath));
+    // Written straight from the tree, with the bytes and checks of a document built and saved.
+    // The file is only renamed into place once the whole tree is written: a writer that refuses
+    // the tree throws, and the target is not touched.
+    XmlFileWriter out(outputPath.ToString(), m_writeOptions.indent);
+    m_calData.WriteXmlText(out, comment);
+    if (outputPath.Length() == 0) return false;
+    out.Commit();
+    return true;
 }
 
 void KestCalmorph::CreateXMLEnvironment() {

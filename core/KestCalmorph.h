@@ -12,8 +12,8 @@
 #include "../platform/XmlDom.h"
 #include "KestLoadError.h"
 #include "KestReadOptions.h"
-#include "KestWriteOptions.h"
 #include "KestReadWarning.h"
+#include "KestWriteOptions.h"
 
 namespace kest {
 
@@ -40,8 +40,9 @@ class KEST_API KestCalmorph {
     size_t GetReadWarningsOmitted() const;
     /// Writes `data` to `outputPath` as a UTF-8 CDF file, with `comment` as the first child of
     /// CAL-DATA when not empty. False for an empty path; throws KestCalmorphDLLError when the
-    /// tree is incomplete (nothing is written) and _com_error when saving fails (an existing
-    /// file is then left as it was). The document lives only for this call.
+    /// tree is incomplete (the target is not touched) and _com_error when saving fails (an existing
+    /// file is then left as it was). The text goes to the file as it is written, with no document
+    /// in memory.
     bool ConvertCPPToXML(KestCdfCalData data, CComBSTR outputPath, CComBSTR comment);
     /// A new default tree; the converter is not touched.
     KestCdfCalData ConvertCPPToXML();

@@ -11,6 +11,7 @@
 #include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
 #include "KestCdfReadWarnings.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -235,6 +236,18 @@ bool KestCdfAxis::ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* d
             element->appendChild(textNode);
         });
     return true;
+}
+
+void KestCdfAxis::WriteXmlText(XmlFileWriter& out) {
+    out.StartElement(ElementName().View());
+    out.Attribute(SizeName().View(), BstrView(SizeText(m_size).bstrVal));
+    out.Attribute(UnitsName().View(), BstrView(m_swUnits.m_string));
+    out.Attribute(FormatTypeName().View(), BstrView(m_formatType.m_string));
+    if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kAxisValueEmpty);
+    detail::FormatValueListUtf8(m_value, detail::ElementWriting::kAxis,
+                                detail::IsFormatType(m_formatType, detail::kFormatString),
+                                [&](std::string_view text) { out.Text(text); });
+    out.EndElement();
 }
 
 }  // namespace kest

@@ -11,6 +11,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfAxis {
   public:
     /// An empty axis: value VT_EMPTY, size 0, empty units and format type.
@@ -58,6 +60,7 @@ class KEST_API KestCdfAxis {
     /// true.
     bool ConvertAxisNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                               KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     void SetAxisAttributes(IXMLDOMNamedNodeMapPtr attributes);

@@ -7,6 +7,7 @@
 #include <string_view>
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -179,6 +180,33 @@ bool KestCdfCalData::ConvertCalDataNodeToXML(IXMLDOMDocument* doc, CComBSTR comm
         lists[i].ConvertCalListNodeToXML(root, doc, m_namespace);
     }
     return true;
+}
+
+void KestCdfCalData::WriteXmlText(XmlFileWriter& out, const CComBSTR& comment) {
+    out.StartElement(u"CAL-DATA");
+    // The root's attributes are checked after its first children, as the document is built.
+    out.HoldStartTag();
+    if (comment.Length() != 0) out.Comment(comment.View());
+    m_changeHistory.WriteXmlText(out);
+    detail::WriteTextElement(out, u"FILENAME", m_fileName.m_string);
+    if (m_company.m_string != nullptr)
+        detail::WriteTextElement(out, u"COMPANY-INFO", m_company.m_string);
+    if (m_note != nullptr) detail::WriteTextElement(out, u"NOTE", m_note);
+    out.Attribute(u"xmlns", BstrView(m_namespace.m_string));
+    if (m_schemaInstance.m_string == nullptr) {
+        KestCalmorphDLLError::Raise(reason::kSchemaInstanceMissing);
+    }
+    out.Attribute(u"xmlns:xsi", BstrView(m_schemaInstance.m_string));
+    if (m_schemaLocation.m_string == nullptr) {
+        KestCalmorphDLLError::Raise(reason::kSchemaLocationMissing);
+    }
+    const bool noNamespace = m_namespace.m_string.Length() == 0;
+    out.Attribute(noNamespace ? u"xsi:noNamespaceSchemaLocation" : u"xsi:schemaLocation",
+                  BstrView(m_schemaLocation.m_string));
+    out.ReleaseStartTag();
+    KestCdfCalList* const lists = m_calLists.Checked(m_calListSize);
+    for (int i = 0; i < m_calListSize; ++i) lists[i].WriteXmlText(out);
+    out.EndElement();
 }
 
 }  // namespace kest

@@ -14,6 +14,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfCalData {
   public:
     /// Empty strings, no lists (size 0), an empty change history.
@@ -82,6 +84,9 @@ class KEST_API KestCdfCalData {
     /// KestCalmorphDLLError 23 or 24 for a null schema instance or location and passes the
     /// errors of the lists on; _com_error(E_POINTER) for a null document. Returns true.
     bool ConvertCalDataNodeToXML(IXMLDOMDocument* doc, CComBSTR comment);
+    /// The same text as ConvertCalDataNodeToXML and a save, written straight to `out`, with the
+    /// same checks in the same order.
+    void WriteXmlText(XmlFileWriter& out, const CComBSTR& comment);
 
   private:
     _bstr_t GetNodeString(IXMLDOMNodePtr node);

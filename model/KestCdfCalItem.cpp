@@ -4,6 +4,7 @@
 #include "KestCdfReadWarnings.h"
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -107,6 +108,24 @@ bool KestCdfCalItem::ConvertCalItemNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocum
         throw;
     }
     return true;
+}
+
+void KestCdfCalItem::WriteXmlText(XmlFileWriter& out) {
+    try {
+        out.StartElement(u"CAL-ITEM");
+        if (m_name.m_string == nullptr) KestCalmorphDLLError::Raise(reason::kCalItemNameMissing);
+        detail::WriteTextElement(out, u"NAME", m_name.m_string);
+        KestCdfAxis* const axes = m_axes.Checked(m_axisSize);
+        for (int i = 0; i < m_axisSize; ++i) axes[i].WriteXmlText(out);
+        if (!m_value.get()) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
+        m_value.get()->WriteXmlText(out);
+        if (m_annotation != nullptr) detail::WriteTextElement(out, u"ANNOTATION", m_annotation);
+        if (m_note != nullptr) detail::WriteTextElement(out, u"NOTE", m_note);
+        out.EndElement();
+    } catch (KestCalmorphDLLError& error) {
+        error.SetReasonString(m_name.m_string);
+        throw;
+    }
 }
 
 }  // namespace kest

@@ -15,6 +15,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfCalItem {
   public:
     /// Null name, annotation and note; no value, no axes, axis size 0.
@@ -77,6 +79,7 @@ class KEST_API KestCdfCalItem {
     /// failures pass as _com_error. Returns true.
     bool ConvertCalItemNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                  KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     int CountAxisNodes(IXMLDOMNodePtr node);

@@ -7,6 +7,7 @@
 #include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
 #include "KestCdfReadWarnings.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -178,6 +179,17 @@ bool KestCdfCalItemValue::ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent, IX
             element->appendChild(textNode);
         });
     return true;
+}
+
+void KestCdfCalItemValue::WriteXmlText(XmlFileWriter& out) {
+    out.StartElement(ElementName().View());
+    out.Attribute(UnitsName().View(), BstrView(m_units.m_string));
+    out.Attribute(FormatTypeName().View(), BstrView(m_formatType.m_string));
+    if (m_value.vt == VT_EMPTY) KestCalmorphDLLError::Raise(reason::kCalItemValueMissing);
+    detail::FormatValueListUtf8(m_value, detail::ElementWriting::kCalItemValue,
+                                detail::IsFormatType(m_formatType, detail::kFormatString),
+                                [&](std::string_view text) { out.Text(text); });
+    out.EndElement();
 }
 
 }  // namespace kest

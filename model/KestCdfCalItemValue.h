@@ -11,6 +11,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfCalItemValue {
   public:
     /// An empty value: VT_EMPTY, empty units and format type, not read from a document.
@@ -56,6 +58,7 @@ class KEST_API KestCdfCalItemValue {
     /// document. Returns true.
     bool ConvertCalItemValueNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                       KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     _bstr_t GetNodeString(IXMLDOMNodePtr node);

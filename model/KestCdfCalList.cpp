@@ -3,6 +3,7 @@
 #include "detail/DomWriting.h"
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -101,6 +102,19 @@ bool KestCdfCalList::ConvertCalListNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocum
         items[i].ConvertCalItemNodeToXML(list, doc, ns);
     }
     return true;
+}
+
+void KestCdfCalList::WriteXmlText(XmlFileWriter& out) {
+    out.StartElement(u"CAL-LIST");
+    if (m_name.m_string == nullptr) KestCalmorphDLLError::Raise(reason::kCalListNameMissing);
+    detail::WriteTextElement(out, u"NAME", m_name.m_string);
+    if (!m_symbolicFile.get()) KestCalmorphDLLError::Raise(reason::kSymbolicFileMissing);
+    m_symbolicFile.get()->WriteXmlText(out);
+    if (m_targetImage.get()) m_targetImage.get()->WriteXmlText(out);
+    if (m_note != nullptr) detail::WriteTextElement(out, u"NOTE", m_note);
+    KestCdfCalItem* const items = m_calItems.Checked(m_calItemSize);
+    for (int i = 0; i < m_calItemSize; ++i) items[i].WriteXmlText(out);
+    out.EndElement();
 }
 
 }  // namespace kest

@@ -15,6 +15,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfCalList {
   public:
     /// Null name and note, no file references, no items, item size -1 (not set).
@@ -73,6 +75,7 @@ class KEST_API KestCdfCalList {
     /// 25 without a symbolic file; errors of the items pass unchanged. Returns true.
     bool ConvertCalListNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                  KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     int CountCalItem(IXMLDOMNodePtr node);

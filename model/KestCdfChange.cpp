@@ -1,6 +1,7 @@
 #include "KestCdfChange.h"
 
 #include "detail/DomWriting.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -91,6 +92,18 @@ bool KestCdfChange::ConvertChangeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* d
         AppendTextElement(change, doc, kDataVersion, uri, m_dataVersion.m_string);
     }
     return true;
+}
+
+void KestCdfChange::WriteXmlText(XmlFileWriter& out) {
+    out.StartElement(u"CHANGE");
+    detail::WriteTextElement(out, kUserName, m_userName.m_string);
+    CComBSTR date = m_date.CreateTimeString();
+    detail::WriteTextElement(out, kDate, date);
+    if (m_tool != nullptr) detail::WriteTextElement(out, kTool, m_tool);
+    if (m_note != nullptr) detail::WriteTextElement(out, kNote, m_note);
+    if (m_dataVersion.m_string != nullptr)
+        detail::WriteTextElement(out, kDataVersion, m_dataVersion.m_string);
+    out.EndElement();
 }
 
 }  // namespace kest

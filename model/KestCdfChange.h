@@ -12,6 +12,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfChange {
   public:
     /// Empty strings (null) and the current local time as date.
@@ -47,6 +49,7 @@ class KEST_API KestCdfChange {
     /// pass as _com_error.
     bool ConvertChangeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                             KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     KestCdfNormalizedString m_userName;

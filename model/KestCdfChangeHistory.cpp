@@ -1,6 +1,7 @@
 #include "KestCdfChangeHistory.h"
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -51,6 +52,13 @@ bool KestCdfChangeHistory::ConvertChangeHistoryToXML(IXMLDOMNodePtr parent, IXML
     KestCdfChange* const changes = m_changes.Checked(m_count);
     for (int i = 0; i < m_count; ++i) changes[i].ConvertChangeToXML(history, doc, ns);
     return true;
+}
+
+void KestCdfChangeHistory::WriteXmlText(XmlFileWriter& out) {
+    out.StartElement(u"CHANGE-HISTORY");
+    KestCdfChange* const changes = m_changes.Checked(m_count);
+    for (int i = 0; i < m_count; ++i) changes[i].WriteXmlText(out);
+    out.EndElement();
 }
 
 }  // namespace kest

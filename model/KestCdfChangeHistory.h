@@ -10,6 +10,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfChangeHistory {
   public:
     /// No array, count 0.
@@ -39,6 +41,7 @@ class KEST_API KestCdfChangeHistory {
     /// count entries. Returns true; DOM failures pass as _com_error.
     bool ConvertChangeHistoryToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                    KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     int CountChangeNodes(IXMLDOMNodePtr node);

@@ -3,6 +3,7 @@
 #include "detail/DomWriting.h"
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 // A CRC is a 32-bit pattern: decimal text is read over the whole unsigned range, as hexadecimal
@@ -52,6 +53,12 @@ bool KestCdfSymbolicFile::ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr parent, IX
     return detail::AppendFileReference(parent, doc, u"SYMBOLIC-FILE",
                                        _bstr_t(ns.m_string.m_str, true), m_fileName.m_string.m_str,
                                        buffer);
+}
+
+void KestCdfSymbolicFile::WriteXmlText(XmlFileWriter& out) {
+    char buffer[11] = "0x00000000";
+    hdtoa(static_cast<unsigned int>(m_crc), buffer);
+    detail::WriteFileReference(out, u"SYMBOLIC-FILE", m_fileName.m_string.m_str, buffer);
 }
 
 }  // namespace kest

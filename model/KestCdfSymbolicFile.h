@@ -9,6 +9,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfSymbolicFile {
   public:
     /// Empty file name, CRC 0.
@@ -47,6 +49,7 @@ class KEST_API KestCdfSymbolicFile {
     /// CRC as crc32="0xXXXXXXXX". False when the new element has no attribute map.
     bool ConvertSymbolicFileNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                       KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     void SetSymbolicFileAttributes(IXMLDOMNamedNodeMapPtr attributes);

@@ -4,6 +4,7 @@
 
 #include "../platform/KestCalmorphDLLError.h"
 #include "KestCdfSymbolicFile.h"
+#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -50,6 +51,12 @@ bool KestCdfTargetImage::ConvertTargetImageFileNodeToXML(IXMLDOMNodePtr parent,
     return detail::AppendFileReference(parent, doc, u"TARGET-IMAGE",
                                        _bstr_t(ns.m_string.m_str, true), m_fileName.m_string.m_str,
                                        buffer);
+}
+
+void KestCdfTargetImage::WriteXmlText(XmlFileWriter& out) {
+    char buffer[11] = "0x00000000";
+    hdtoa(static_cast<unsigned int>(m_crc), buffer);
+    detail::WriteFileReference(out, u"TARGET-IMAGE", m_fileName.m_string.m_str, buffer);
 }
 
 }  // namespace kest

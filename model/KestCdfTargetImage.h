@@ -9,6 +9,8 @@
 
 namespace kest {
 
+class XmlFileWriter;
+
 class KEST_API KestCdfTargetImage {
   public:
     /// Empty file name, CRC 0.
@@ -43,6 +45,7 @@ class KEST_API KestCdfTargetImage {
     /// CRC as crc32="0xXXXXXXXX". False when the new element has no attribute map.
     bool ConvertTargetImageFileNodeToXML(IXMLDOMNodePtr parent, IXMLDOMDocument* doc,
                                          KestCdfNormalizedString ns);
+    void WriteXmlText(XmlFileWriter& out);
 
   private:
     void SetTargetImageAttributes(IXMLDOMNamedNodeMapPtr attributes);

@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <cstring>
 
+#include "../../platform/XmlFileWriter.h"
 #include "ValueListCodec.h"
 
 namespace kest {
@@ -35,6 +36,20 @@ bool AppendFileReference(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, con
     if (!attributes) return false;
     AddAttribute(doc, attributes, u"crc32", CComBSTR(crcText));
     return true;
+}
+
+void WriteTextElement(XmlFileWriter& out, const OLECHAR* name, BSTR text) {
+    out.StartElement(name);
+    out.Text(BstrView(text));
+    out.EndElement();
+}
+
+void WriteFileReference(XmlFileWriter& out, const OLECHAR* name, BSTR fileName,
+                        const char* crcText) {
+    out.StartElement(name);
+    out.Attribute(u"crc32", CComBSTR(crcText).View());
+    out.Text(BstrView(fileName));
+    out.EndElement();
 }
 
 CComBSTR TextOf(const IXMLDOMNodePtr& node) {

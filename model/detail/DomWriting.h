@@ -6,6 +6,9 @@
 #include "../../text/KestCdfNormalizedString.h"
 
 namespace kest {
+
+class XmlFileWriter;
+
 namespace detail {
 
 /// Creates the element `name` in namespace `ns` and appends it to `parent` (which is checked
@@ -22,6 +25,11 @@ IXMLDOMNodePtr AppendTextElement(const IXMLDOMNodePtr& parent, IXMLDOMDocument* 
 /// attribute. False when the new element offers no attribute map (the element stays).
 bool AppendFileReference(const IXMLDOMNodePtr& parent, IXMLDOMDocument* doc, const OLECHAR* name,
                          const _bstr_t& ns, BSTR fileName, const char* crcText);
+
+/// AppendTextElement and AppendFileReference for a streamed write.
+void WriteTextElement(XmlFileWriter& out, const OLECHAR* name, BSTR text);
+void WriteFileReference(XmlFileWriter& out, const OLECHAR* name, BSTR fileName,
+                        const char* crcText);
 
 /// Reads the text of a SYMBOLIC-FILE or TARGET-IMAGE element: the last child's value stands;
 /// an element without children leaves `fileName` as it was.

@@ -11,6 +11,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
+#include <utility>
 
 #include "ExpatLoader.h"
 #include "XmlWriter.h"
@@ -62,58 +63,79 @@ mode_t DefaultMode() {
 
 }  // namespace
 
-void SaveAtomically(const DomNode* document, const std::string& path, bool indent) {
-    if (path.empty()) Fail(ENOENT, "cannot save to", path);
+AtomicFile::AtomicFile(std::string path) : m_path(std::move(path)) {}
+
+AtomicFile::~AtomicFile() {
+    if (m_fd >= 0) ::close(m_fd);
+    if (!m_temp.empty() && !m_committed) ::unlink(m_temp.c_str());
+}
+
+void AtomicFile::Keep(int err, const char* what) noexcept {
+    if (m_error != 0) return;
+    m_error = err;
+    try {
+        m_what = what;
+    } catch (...) {
+    }
+}
+
+void AtomicFile::Open() {
+    m_opened = true;
+    const std::string& path = m_path;
+    if (path.empty()) return Keep(ENOENT, "cannot save to");
     // Saving through a symbolic link replaces the file it points to, not the link.
-    std::string target = path;
+    m_target = path;
     struct stat link {};
     if (::lstat(path.c_str(), &link) == 0 && S_ISLNK(link.st_mode)) {
         char* resolved = ::realpath(path.c_str(), nullptr);
         if (resolved) {
-            target = resolved;
+            m_target = resolved;
             std::free(resolved);
         }
     }
+    const std::string& target = m_target;
     std::string::size_type slash = target.rfind('/');
-    std::string dir =
-        slash == std::string::npos ? "." : (slash == 0 ? "/" : target.substr(0, slash));
+    m_dir = slash == std::string::npos ? "." : (slash == 0 ? "/" : target.substr(0, slash));
     std::string base = slash == std::string::npos ? target : target.substr(slash + 1);
-    if (base.empty()) Fail(EISDIR, "cannot save to", path);
+    if (base.empty()) return Keep(EISDIR, "cannot save to");
     struct stat st {};
-    mode_t mode = 0;
     if (::stat(target.c_str(), &st) == 0) {
-        if (S_ISDIR(st.st_mode)) Fail(EISDIR, "cannot save to", path);
-        mode = st.st_mode & 07777;  // a replaced file keeps its permissions
+        if (S_ISDIR(st.st_mode)) return Keep(EISDIR, "cannot save to");
+        m_mode = st.st_mode & 07777;  // a replaced file keeps its permissions
     } else {
-        mode = DefaultMode();
+        m_mode = DefaultMode();
     }
-    RemoveStaleTemporaries(dir, base);
-    std::string temp = dir + "/" + TempPrefix(base) +
+    RemoveStaleTemporaries(m_dir, base);
+    std::string temp = m_dir + "/" + TempPrefix(base) +
                        std::to_string(static_cast<long>(::getpid())) + ".tmp-XXXXXX";
-    int fd = ::mkstemp(&temp[0]);
-    if (fd < 0) Fail(errno, "cannot save to", path);
-    struct TempFile {
-        int fd;
-        const std::string& path;
-        bool keep = false;
-        ~TempFile() {
-            if (fd >= 0) ::close(fd);
-            if (!keep) ::unlink(path.c_str());
+    m_fd = ::mkstemp(&temp[0]);
+    if (m_fd < 0) return Keep(errno, "cannot save to");
+    m_temp = std::move(temp);
+}
+
+void AtomicFile::Write(std::string_view piece) noexcept {
+    if (!m_opened) {
+        try {
+            Open();
+        } catch (...) {
+            Keep(ENOMEM, "cannot save to");
         }
-    } guard{fd, temp};
-    auto write = [&](std::string_view piece) {
-        while (!piece.empty()) {
-            ssize_t n = ::write(fd, piece.data(), piece.size());
-            if (n < 0) {
-                if (errno == EINTR) continue;
-                Fail(errno, "cannot write", path);
-            }
-            piece.remove_prefix(static_cast<std::size_t>(n));
+    }
+    if (m_error != 0) return;
+    while (!piece.empty()) {
+        ssize_t n = ::write(m_fd, piece.data(), piece.size());
+        if (n < 0) {
+            if (errno == EINTR) continue;
+            return Keep(errno, "cannot write");
         }
-    };
-    std::string buffer;
-    buffer.reserve(1024 * 1024 + 64 * 1024);
-    long unrepresentable = WriteXml(document, buffer, write, indent);
+        piece.remove_prefix(static_cast<std::size_t>(n));
+    }
+}
+
+void AtomicFile::Commit(long unrepresentable) {
+    if (!m_opened) Write({});
+    if (m_error != 0) Fail(m_error, m_what.c_str(), m_path);
+    const std::string& path = m_path;
     if (unrepresentable >= 0) {
         // The file would not load again: refuse it rather than report a save that loses data.
         char code[32];
@@ -121,19 +143,29 @@ void SaveAtomically(const DomNode* document, const std::string& path, bool inden
         throw _com_error(E_FAIL, "cannot save " + path + ": the document holds character " + code +
                                      ", which XML 1.0 cannot represent");
     }
-    if (::fchmod(fd, mode) != 0) Fail(errno, "cannot save to", path);
-    if (::fsync(fd) != 0) Fail(errno, "cannot write", path);
-    guard.fd = -1;
+    if (::fchmod(m_fd, static_cast<mode_t>(m_mode)) != 0) Fail(errno, "cannot save to", path);
+    if (::fsync(m_fd) != 0) Fail(errno, "cannot write", path);
+    const int fd = m_fd;
+    m_fd = -1;
     if (::close(fd) != 0) Fail(errno, "cannot write", path);
-    if (::rename(temp.c_str(), target.c_str()) != 0) Fail(errno, "cannot save to", path);
-    guard.keep = true;
+    if (::rename(m_temp.c_str(), m_target.c_str()) != 0) Fail(errno, "cannot save to", path);
+    m_committed = true;
     // The rename is durable once the directory is: sync it (a failure here leaves a complete
     // file in place, so it is not reported).
-    int dirFd = ::open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    int dirFd = ::open(m_dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     if (dirFd >= 0) {
         (void)::fsync(dirFd);
         ::close(dirFd);
     }
+}
+
+void SaveAtomically(const DomNode* document, const std::string& path, bool indent) {
+    AtomicFile file(path);
+    std::string buffer;
+    buffer.reserve(1024 * 1024 + 64 * 1024);
+    long unrepresentable = WriteXml(
+        document, buffer, [&](std::string_view piece) { file.Write(piece); }, indent);
+    file.Commit(unrepresentable);
 }
 
 }  // namespace detail

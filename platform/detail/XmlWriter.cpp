@@ -293,6 +293,22 @@ void AppendSubtree(Output& out, const DomNode* root, const XmlFlush& flush, bool
 
 }  // namespace
 
+long AppendEscapedText(std::string& text, std::string_view value, bool attribute) {
+    Output out;
+    out.swap(text);
+    AppendEscaped(out, value, attribute);
+    out.swap(text);
+    return out.unrepresentable;
+}
+
+long AppendCommentText(std::string& text, std::string_view value) {
+    Output out;
+    out.swap(text);
+    AppendComment(out, value);
+    out.swap(text);
+    return out.unrepresentable;
+}
+
 long WriteXml(const DomNode* node, std::string& text, const XmlFlush& flush, bool indent) {
     Output out;
     out.swap(text);

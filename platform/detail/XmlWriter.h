@@ -37,5 +37,12 @@ using XmlFlush = std::function<void(std::string_view)>;
 long WriteXml(const DomNode* node, std::string& out, const XmlFlush& flush = nullptr,
               bool indent = false);
 
+/// Appends `text` escaped as WriteXml escapes a text node (or, with `attribute`, an attribute
+/// value); returns -1 or the first character met that XML 1.0 cannot carry.
+long AppendEscapedText(std::string& out, std::string_view text, bool attribute);
+
+/// Appends a comment holding `text` as WriteXml writes one; returns as AppendEscapedText.
+long AppendCommentText(std::string& out, std::string_view text);
+
 }  // namespace detail
 }  // namespace kest
