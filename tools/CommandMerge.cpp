@@ -64,7 +64,9 @@ int RunMerge(const MergeOptions& options) {
     }
     if (!result.conflicts.empty() && !result.resolved) {
         ReportError(DisplayName(options.out, true),
-                    std::to_string(result.conflicts.size()) + " conflicts; nothing was written",
+                    std::to_string(result.conflicts.size()) +
+                        (result.conflicts.size() == 1 ? " conflict" : " conflicts") +
+                        "; nothing was written",
                     "use --prefer ours or --prefer theirs to resolve every conflict to one side");
         return 1;
     }
