@@ -164,10 +164,11 @@ std::vector<Change> JoinHistories(const Document& base, const Document& ours,
     return out;
 }
 
-const CalList* FindList(const Document& document, const std::string& name) {
-    for (const CalList& list : document.lists)
-        if (list.name.value_or("") == name) return &list;
-    return nullptr;
+// The first list of each name.
+std::map<std::string, const CalList*> ListsByName(const Document& document) {
+    std::map<std::string, const CalList*> lists;
+    for (const CalList& list : document.lists) lists.emplace(list.name.value_or(""), &list);
+    return lists;
 }
 
 }  // namespace
@@ -214,11 +215,23 @@ MergeResult Merge(const Document& base, const Document& ours, const Document& th
         return found == items.end() ? nullptr : found->second;
     };
 
+    // Each list's items in the order of ours, then theirs, then base.
+    std::map<std::string, std::vector<ItemKey>> keysByList;
+    for (const auto* items : {&itemsOurs, &itemsTheirs, &itemsBase})
+        for (const IndexedItem& entry : *items) keysByList[entry.key.list].push_back(entry.key);
+    const auto listsBase = ListsByName(base), listsOurs = ListsByName(ours),
+               listsTheirs = ListsByName(theirs);
+    auto findList = [](const std::map<std::string, const CalList*>& lists,
+                       const std::string& name) {
+        auto found = lists.find(name);
+        return found == lists.end() ? nullptr : found->second;
+    };
+
     out.lists.clear();
     for (const std::string& name : names) {
-        const CalList* b = FindList(base, name);
-        const CalList* o = FindList(ours, name);
-        const CalList* t = FindList(theirs, name);
+        const CalList* b = findList(listsBase, name);
+        const CalList* o = findList(listsOurs, name);
+        const CalList* t = findList(listsTheirs, name);
         CalList list = o ? *o : *t;
         list.items.clear();
         if (o && t) {
@@ -234,12 +247,8 @@ MergeResult Merge(const Document& base, const Document& ours, const Document& th
                 merger.Pick(name, none, "target-image", b ? &b->targetImage : nullptr,
                             o->targetImage, t->targetImage, same, detail::OptionalFileRef);
         }
-        std::vector<ItemKey> keys;
-        for (const auto* items : {&itemsOurs, &itemsTheirs, &itemsBase})
-            for (const IndexedItem& entry : *items)
-                if (entry.key.list == name) keys.push_back(entry.key);
         std::set<ItemKey> done;
-        for (const ItemKey& key : keys) {
+        for (const ItemKey& key : keysByList[name]) {
             if (!done.insert(key).second) continue;
             const Item* ib = find(inBase, key);
             const Item* io = find(inOurs, key);

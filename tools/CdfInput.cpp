@@ -91,4 +91,14 @@ std::size_t ReadCdf(KestCalmorph& converter, const std::string& argument,
     return converter.GetReadWarnings().size() + omitted;
 }
 
+ops::Document ReadDocument(const std::string& argument, const ReadSettings& settings,
+                           std::vector<KestReadWarning>* warnings, std::size_t* warningsOmitted) {
+    KestCalmorph converter;
+    KestCdfCalData data;
+    ReadCdf(converter, argument, settings, data);
+    if (warnings) *warnings = converter.GetReadWarnings();
+    if (warningsOmitted) *warningsOmitted = converter.GetReadWarningsOmitted();
+    return ops::FromCalData(data);
+}
+
 }  // namespace kest::tool

@@ -6,6 +6,9 @@
 #include <CLI/CLI.hpp>
 
 #include <string>
+#include <vector>
+
+#include "ops/Document.h"
 
 #include "ExitCode.h"
 
@@ -32,6 +35,12 @@ KestReadOptions ReadOptionsOf(const ReadSettings& settings);
 /// KestCalmorphDLLError when the converter refuses its content.
 std::size_t ReadCdf(KestCalmorph& converter, const std::string& argument,
                     const ReadSettings& settings, KestCdfCalData& data);
+
+/// The document of `argument`, read as ReadCdf does; the converter's read warnings are kept in
+/// `warnings` when given.
+ops::Document ReadDocument(const std::string& argument, const ReadSettings& settings,
+                           std::vector<KestReadWarning>* warnings = nullptr,
+                           std::size_t* warningsOmitted = nullptr);
 
 /// Throws ToolError(`code`) for a failed load or validation of `argument`, its reason after
 /// `lead`.

@@ -12,6 +12,7 @@ namespace kest::tool {
 struct Command {
     CLI::App* app = nullptr;
     std::function<int()> run;  // returns the exit code
+    int usageExit = 1;         // the exit code of a usage error (2 where 1 means "differ")
 };
 
 Command AddInfoCommand(CLI::App& calmorph);
@@ -21,6 +22,9 @@ Command AddSchemaLocationCommand(CLI::App& calmorph);
 Command AddShowCommand(CLI::App& calmorph);
 Command AddExportCommand(CLI::App& calmorph);
 Command AddImportCommand(CLI::App& calmorph);
+Command AddDiffCommand(CLI::App& calmorph);
+Command AddMergeCommand(CLI::App& calmorph);
+Command AddCheckCommand(CLI::App& calmorph);
 Command AddReportCommand(CLI::App& calmorph);
 
 }  // namespace kest::tool

@@ -24,11 +24,20 @@ constexpr const char* kOverview =
     "      Read IN and write it to OUT as a UTF-8 CDF file, with TEXT as a comment at the\n"
     "      start of CAL-DATA. OUT is replaced only when the whole file could be written.\n"
     "      --indent: one element per line, for line diffs.\n"
+    "  calmorph convert IN... --output-dir DIR [-j N] [--indent] [READ OPTIONS]\n"
+    "      Convert many files to DIR/NAME on N threads at once.\n"
     "  calmorph export FILE --format json|csv [-o OUT] [READ OPTIONS]\n"
     "      Write everything FILE holds as JSON (lossless), or its values as CSV.\n"
     "  calmorph import FILE.json -o OUT [--indent]\n"
     "      Write the CDF file a JSON export stands for.\n"
-    "  calmorph validate FILE... [--schema XSD]\n"
+    "  calmorph diff A B [--tolerance ABS] [--rel-tolerance REL] [--ignore-history] [--json]\n"
+    "      Compare two files item by item (matched by list and name): exit 0 equal, 1 differ.\n"
+    "  calmorph merge BASE OURS THEIRS -o OUT [--prefer ours|theirs] [--indent]\n"
+    "      Three-way merge by item and element; conflicts exit 1 and write nothing.\n"
+    "  calmorph check FILE... [--verify-crc] [--json] [-j N]\n"
+    "      Report what the schema cannot see: axis sizes, value counts, duplicates, axis\n"
+    "      order, texts in numbers; with --verify-crc the CRC-32 of referenced files.\n"
+    "  calmorph validate FILE... [--schema XSD] [-j N]\n"
     "      Check each FILE against the schema it names (xsi:schemaLocation, resolved beside\n"
     "      the file), or against XSD under the CDF namespace. One line per file.\n"
     "  calmorph schema-location FILE\n"
@@ -53,13 +62,16 @@ constexpr const char* kOverview =
     "  5  the output file cannot be written\n"
     "  6  the file names no schema (no xsi:schemaLocation on its root)\n"
     "  7  show: an ITEM or the --list NAME matches nothing\n"
+    "diff, merge and check exit 1 when the files differ, conflict or have findings, and 2 for\n"
+    "a usage error; see their --help.\n"
     "With several files, validate exits with the highest code of any file.\n"
     "Errors go to standard error as FILE:LINE:COL: error: TEXT, as far as the position is known.";
 
 // Every command of the tool, in the order of the help text.
 constexpr Command (*kCommands[])(CLI::App&) = {
-    AddInfoCommand,     AddShowCommand,   AddConvertCommand,         AddExportCommand,
-    AddImportCommand,   AddReportCommand,   AddValidateCommand,        AddSchemaLocationCommand};
+    AddInfoCommand,     AddShowCommand,  AddConvertCommand, AddExportCommand,
+    AddImportCommand,   AddDiffCommand,  AddMergeCommand,   AddCheckCommand,
+    AddReportCommand,   AddValidateCommand, AddSchemaLocationCommand};
 
 }  // namespace
 
@@ -93,15 +105,19 @@ int RunCommandLine(int argc, char** argv) {
             return kExitUsage;
         }
         std::string usage = "calmorph";
+        int code = kExitUsage;
         for (const Command& command : commands) {
-            if (command.app->parsed()) usage += " " + command.app->get_name();
+            if (command.app->parsed()) {
+                usage += " " + command.app->get_name();
+                code = command.usageExit;
+            }
         }
         std::string text = error.what();
         if (usage == "calmorph" && argv[1][0] != '-') {
             text = "unknown command '" + std::string(argv[1]) + "'";
         }
         ReportError("calmorph", text, "see '" + usage + " --help'");
-        return kExitUsage;
+        return code;
     }
     for (const Command& command : commands) {
         if (command.app->parsed()) return GuardedRun({}, command.run);

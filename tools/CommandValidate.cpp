@@ -10,6 +10,7 @@
 #include "Diagnostics.h"
 #include "ExitCode.h"
 #include "GuardedRun.h"
+#include "ManyFiles.h"
 #include "ToolError.h"
 
 namespace kest::tool {
@@ -19,6 +20,7 @@ namespace {
 struct ValidateOptions {
     std::vector<std::string> files;
     std::string schema;
+    unsigned jobs = 1;
 };
 
 // The schema location the root names: the text after the first blank of xsi:schemaLocation,
@@ -64,7 +66,7 @@ int ValidateAgainstNamedSchema(const std::string& file) {
         const ExitCode code = Verdict(result->GeterrorCode());
         ThrowLoadFailure(file, result, code, Lead(code, location), kSchemaHint);
     }
-    std::printf("%s: valid against %s\n", DisplayName(file).c_str(), location.c_str());
+    Print(DisplayName(file) + ": valid against " + location + "\n");
     return kExitOk;
 }
 
@@ -83,21 +85,19 @@ int ValidateAgainstSchemaFile(KestCalmorph& converter, const std::string& file,
     if (error.code != 0) {
         ThrowLoadFailure(file, error, Verdict(error.code), Lead(Verdict(error.code), schema));
     }
-    std::printf("%s: valid against %s\n", DisplayName(file).c_str(), schema.c_str());
+    Print(DisplayName(file) + ": valid against " + schema + "\n");
     return kExitOk;
 }
 
 int RunValidate(const ValidateOptions& options) {
-    KestCalmorph converter;
-    int worst = kExitOk;
-    for (const std::string& file : options.files) {
-        worst = std::max(worst, GuardedRun({file}, [&] {
-                             return options.schema.empty() ? ValidateAgainstNamedSchema(file)
-                                                           : ValidateAgainstSchemaFile(
-                                                                 converter, file, options.schema);
-                         }));
-    }
-    return worst;
+    return RunEachFile(options.files, options.jobs, [&](std::size_t, const std::string& file) {
+        KestCalmorph converter;
+        return GuardedRun({file}, [&] {
+            return options.schema.empty()
+                       ? ValidateAgainstNamedSchema(file)
+                       : ValidateAgainstSchemaFile(converter, file, options.schema);
+        });
+    });
 }
 
 }  // namespace
@@ -113,7 +113,9 @@ Command AddValidateCommand(CLI::App& calmorph) {
     app->add_option("--schema", options->schema,
                     "validate against this XSD instead of the schema each file names")
         ->type_name("XSD");
+    AddJobsOption(*app, options->jobs);
     app->footer(
+        "Files are checked on -j threads at once; the lines keep the order of the files.\n"
         "Exit codes (with several files, the highest of any file):\n"
         "  0  every file is valid\n"
         "  1  usage error\n"

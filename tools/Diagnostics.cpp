@@ -6,12 +6,31 @@ namespace kest::tool {
 
 namespace {
 
+thread_local CapturedOutput* t_capture = nullptr;
+
 void Report(const std::string& where, const char* kind, const std::string& text) {
-    std::fprintf(stderr, "%s: %s: %s\n", where.empty() ? "calmorph" : where.c_str(), kind,
-                 text.c_str());
+    PrintError((where.empty() ? "calmorph" : where) + ": " + kind + ": " + text + "\n");
 }
 
 }  // namespace
+
+void CaptureOutput(CapturedOutput* capture) { t_capture = capture; }
+
+void Print(const std::string& text) {
+    if (t_capture) {
+        t_capture->out += text;
+    } else {
+        std::fwrite(text.data(), 1, text.size(), stdout);
+    }
+}
+
+void PrintError(const std::string& text) {
+    if (t_capture) {
+        t_capture->err += text;
+    } else {
+        std::fwrite(text.data(), 1, text.size(), stderr);
+    }
+}
 
 std::string Where(const std::string& file, long line, long column) {
     std::string where = file;
@@ -35,7 +54,7 @@ std::string ReasonOf(const KestCalmorphDLLError& error) {
 
 void ReportError(const std::string& where, const std::string& text, const std::string& hint) {
     Report(where, "error", text);
-    if (!hint.empty()) std::fprintf(stderr, "hint: %s\n", hint.c_str());
+    if (!hint.empty()) PrintError("hint: " + hint + "\n");
 }
 
 void ReportWarning(const std::string& where, const std::string& text) {

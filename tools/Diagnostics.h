@@ -11,6 +11,21 @@
 
 namespace kest::tool {
 
+/// What a file's run printed, kept while files run on several threads so that the report keeps
+/// the order of the arguments.
+struct CapturedOutput {
+    std::string out;
+    std::string err;
+};
+
+/// Sends this thread's Print, PrintError and reports to `capture` (null: the streams again).
+void CaptureOutput(CapturedOutput* capture);
+
+/// Standard output, or this thread's capture.
+void Print(const std::string& text);
+/// Standard error, or this thread's capture.
+void PrintError(const std::string& text);
+
 /// "FILE:LINE:COL", "FILE:LINE" or "FILE", as far as the position is known.
 std::string Where(const std::string& file, long line, long column);
 
