@@ -1,0 +1,146 @@
+import datetime
+import os
+from typing import Any, Iterator, NamedTuple, Optional, Sequence, Tuple, Union, overload
+
+import numpy as np
+import numpy.typing as npt
+
+_Path = Union[str, os.PathLike[str]]
+_FileRef = Tuple[str, int]
+_Values = Union[npt.NDArray[np.int32], npt.NDArray[np.float64], list[str], list[Any]]
+
+class Error(Exception):
+    reason: int
+    item: str
+    file: str
+    line: int
+    column: int
+    hint: str
+    path: str
+
+class LoadError(Error): ...
+class ValidationError(LoadError): ...
+class ConversionError(Error): ...
+class WriteError(Error): ...
+class JsonError(Error): ...
+
+class TokenWarning(UserWarning):
+    file: str
+    line: int
+    column: int
+    item: str
+    token: str
+    value_read: str
+    kind: str
+
+class Problem(NamedTuple):
+    file: str
+    line: int
+    column: int
+    reason: int
+    message: str
+    hint: str
+
+class Axis:
+    units: str
+    format: str
+    @property
+    def size(self) -> int: ...
+    @property
+    def points(self) -> Optional[npt.NDArray[Any]]: ...
+    @points.setter
+    def points(self, value: npt.ArrayLike) -> None: ...
+
+class Axes(Sequence[Axis]):
+    def __len__(self) -> int: ...
+    @overload
+    def __getitem__(self, index: int) -> Axis: ...
+    @overload
+    def __getitem__(self, index: slice) -> Sequence[Axis]: ...
+    def __iter__(self) -> Iterator[Axis]: ...
+
+class CalItem:
+    name: str
+    format: str
+    units: str
+    annotation: Optional[str]
+    note: Optional[str]
+    @property
+    def values(self) -> _Values: ...
+    @values.setter
+    def values(self, value: Union[npt.ArrayLike, Sequence[str]]) -> None: ...
+    @property
+    def axes(self) -> Axes: ...
+    @property
+    def list(self) -> "CalList": ...
+    @property
+    def shape(self) -> Tuple[int, ...]: ...
+    def plot(self, ax: Any = None, kind: str = "auto") -> Any: ...
+
+class CalItems:
+    def __len__(self) -> int: ...
+    @overload
+    def __getitem__(self, key: int) -> CalItem: ...
+    @overload
+    def __getitem__(self, key: str) -> CalItem: ...
+    def __contains__(self, name: str) -> bool: ...
+    def __iter__(self) -> Iterator[CalItem]: ...
+    def new(self, name: str, values: Union[npt.ArrayLike, Sequence[str]], *,
+            format: Optional[str] = None, units: str = "",
+            axes: Optional[Sequence[Union[int, npt.ArrayLike]]] = None,
+            annotation: Optional[str] = None, note: Optional[str] = None) -> CalItem: ...
+
+class CalList:
+    name: str
+    note: Optional[str]
+    symbolic_file: Optional[_FileRef]
+    target_image: Optional[_FileRef]
+    @property
+    def items(self) -> CalItems: ...
+
+class CalLists:
+    def __len__(self) -> int: ...
+    @overload
+    def __getitem__(self, key: int) -> CalList: ...
+    @overload
+    def __getitem__(self, key: str) -> CalList: ...
+    def __iter__(self) -> Iterator[CalList]: ...
+    def new(self, name: str, *, symbolic_file: Optional[_FileRef] = ("", 0),
+            target_image: Optional[_FileRef] = None, note: Optional[str] = None) -> CalList: ...
+
+class Change:
+    user: str
+    date: datetime.datetime
+    tool: Optional[str]
+    note: Optional[str]
+    data_version: Optional[str]
+
+class History:
+    def __len__(self) -> int: ...
+    def __getitem__(self, index: int) -> Change: ...
+    def __iter__(self) -> Iterator[Change]: ...
+    def new(self, user: str, date: datetime.datetime, *, tool: Optional[str] = None,
+            note: Optional[str] = None, data_version: Optional[str] = None) -> Change: ...
+
+class CalData:
+    file_name: str
+    company: Optional[str]
+    note: Optional[str]
+    namespace: str
+    schema_instance: str
+    schema_location: str
+    def __init__(self) -> None: ...
+    @property
+    def lists(self) -> CalLists: ...
+    @property
+    def history(self) -> History: ...
+    @property
+    def warnings(self) -> list[TokenWarning]: ...
+    def write(self, path: _Path, comment: str = "", indent: bool = False) -> None: ...
+    def to_json(self) -> str: ...
+    def to_dataframe(self) -> Any: ...
+
+def read(path: _Path, *, schema: Optional[_Path] = None, validate: bool = True,
+         offline: bool = False) -> CalData: ...
+def validate(path: _Path, schema: Optional[_Path] = None) -> list[Problem]: ...
+def from_json(text: str) -> CalData: ...
