@@ -23,6 +23,8 @@ namespace py = pybind11;
 struct Tree {
     ops::Document document;
     std::vector<KestReadWarning> warnings;
+    /// The file the tree was read from (empty for a tree made in Python or from JSON).
+    std::string path;
 };
 using TreePtr = std::shared_ptr<Tree>;
 

@@ -7,7 +7,13 @@
 
 #include "Bindings.h"
 #include "core/KestCalmorph.h"
+#include "ops/Check.h"
+#include "ops/Diff.h"
 #include "ops/JsonFormat.h"
+#include "ops/Merge.h"
+
+#include <fstream>
+#include <sstream>
 #include "platform/HResult.h"
 #include "platform/KestCalmorphDLLError.h"
 
@@ -67,6 +73,7 @@ py::object Read(py::handle pathArg, py::handle schemaArg, bool validate, bool of
         Raise("LoadError", path + ": no CAL-DATA element", py::dict(py::arg("file") = path));
     }
     tree->warnings = converter.GetReadWarnings();
+    tree->path = path;
     return MakeCalData(tree);
 }
 
@@ -132,6 +139,60 @@ py::object FromJson(py::handle textArg) {
     return MakeCalData(tree);
 }
 
+py::object Loads(const std::string& json) {
+    return py::module_::import("json").attr("loads")(json);
+}
+
+py::object DiffOf(py::handle a, py::handle b, double tolerance, double relTolerance,
+                  bool ignoreHistory) {
+    ops::DiffOptions options;
+    options.tolerance = tolerance;
+    options.relTolerance = relTolerance;
+    options.ignoreHistory = ignoreHistory;
+    if (!(tolerance >= 0) || !(relTolerance >= 0)) {
+        throw py::value_error("tolerances must be numbers of at least 0");
+    }
+    return Loads(ops::DiffJson(ops::Diff(TreeOf(a)->document, TreeOf(b)->document, options)));
+}
+
+py::object MergeOf(py::handle base, py::handle ours, py::handle theirs, py::handle preferArg) {
+    ops::MergePrefer prefer = ops::MergePrefer::kNone;
+    if (!preferArg.is_none()) {
+        const std::string side = TextArg(preferArg, "prefer");
+        if (side == "ours") {
+            prefer = ops::MergePrefer::kOurs;
+        } else if (side == "theirs") {
+            prefer = ops::MergePrefer::kTheirs;
+        } else {
+            throw py::value_error("prefer must be None, 'ours' or 'theirs', not '" + side + "'");
+        }
+    }
+    ops::MergeResult result = ops::Merge(TreeOf(base)->document, TreeOf(ours)->document,
+                                         TreeOf(theirs)->document, prefer);
+    py::dict out = Loads(ops::MergeJson(result));
+    auto tree = std::make_shared<Tree>();
+    tree->document = std::move(result.merged);
+    out["merged"] = MakeCalData(tree);
+    return std::move(out);
+}
+
+py::object CheckOf(py::handle caldata, bool verifyCrc) {
+    TreePtr tree = TreeOf(caldata);
+    ops::CheckSource source;
+    source.file = tree->path;
+    source.warnings = tree->warnings;
+    if (!tree->path.empty()) {
+        // The text places findings at their items; a file gone since the read only loses that.
+        std::ifstream in(tree->path, std::ios::binary);
+        std::ostringstream text;
+        text << in.rdbuf();
+        source.text = text.str();
+    }
+    ops::CheckOptions options;
+    options.verifyCrc = verifyCrc;
+    return Loads(ops::CheckJson(ops::Check(tree->document, source, options)))["findings"];
+}
+
 }  // namespace
 
 }  // namespace kest::python
@@ -155,4 +216,9 @@ PYBIND11_MODULE(_core, m) {
           py::arg("validate") = true, py::arg("offline") = false);
     m.def("validate", &Validate, py::arg("path"), py::arg("schema") = py::none());
     m.def("from_json", &FromJson, py::arg("text"));
+    m.def("diff", &DiffOf, py::arg("a"), py::arg("b"), py::arg("tolerance") = 0.0,
+          py::arg("rel_tolerance") = 0.0, py::arg("ignore_history") = false);
+    m.def("merge", &MergeOf, py::arg("base"), py::arg("ours"), py::arg("theirs"),
+          py::arg("prefer") = py::none());
+    m.def("check", &CheckOf, py::arg("caldata"), py::arg("verify_crc") = false);
 }

@@ -11,12 +11,12 @@ import warnings as _warnings
 
 from . import _extras
 from ._core import CalData, CalList, CalItem, Axis, Change, CalLists, CalItems, Axes, History
-from ._core import from_json, validate
+from ._core import check, diff, from_json, merge, validate
 from ._core import read as _read
 from ._errors import (Error, LoadError, ValidationError, ConversionError, WriteError, JsonError,
                       TokenWarning, Problem)
 
-__all__ = ["read", "validate", "from_json", "CalData", "CalList", "CalItem", "Axis", "Change",
+__all__ = ["read", "validate", "from_json", "diff", "merge", "check", "CalData", "CalList", "CalItem", "Axis", "Change",
            "Error", "LoadError", "ValidationError", "ConversionError", "WriteError", "JsonError",
            "TokenWarning", "Problem"]
 

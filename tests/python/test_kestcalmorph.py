@@ -174,3 +174,26 @@ def test_dataframe_has_a_row_per_element_and_plots_draw():
     pytest.importorskip("matplotlib").use("Agg")
     assert torque.plot().collections and item(data, "IdleSpeedTarget").plot().lines
     assert torque.plot(kind="surface").name == "3d"
+
+
+def test_diff_merge_and_check_work_on_views():
+    base, ours, theirs = (k.read(SAMPLE) for _ in range(3))
+    assert k.diff(base, ours)["equal"]
+    torque = item(ours, "TorqueLimit")
+    changed = torque.values.astype(float)
+    changed[1, 2] += 0.5
+    torque.values = changed
+    (element,) = k.diff(base, ours)["changed"][0]["elements"]
+    assert (element["index"], element["difference"]) == (5, 0.5)
+    assert k.diff(base, ours, tolerance=0.5)["equal"]
+    item(theirs, "KnockRetardMax").values = 9.0
+    merged = k.merge(base, ours, theirs)
+    assert merged["conflicts"] == []
+    assert item(merged["merged"], "TorqueLimit").values[1, 2] == changed[1, 2]
+    assert item(merged["merged"], "KnockRetardMax").values == 9.0
+    item(theirs, "TorqueLimit").values = changed + 1
+    assert k.merge(base, ours, theirs)["conflicts"][0]["item"] == "TorqueLimit"
+    with pytest.raises(ValueError):
+        k.merge(base, ours, theirs, prefer="mine")
+    kinds = {f["kind"] for f in k.check(base, verify_crc=True)}
+    assert kinds == {"crc-missing"}
