@@ -23,7 +23,8 @@ int main(int argc, char** argv) {
         converter.SetReadOptions(options);
         kest::CComBSTR message;
         const auto start = std::chrono::steady_clock::now();
-        kest::KestCdfCalData data = converter.ConvertXMLtoCPP(kest::CComBSTR(argv[1]), true, message);
+        kest::KestCdfCalData data =
+            converter.ConvertXMLtoCPP(kest::CComBSTR(argv[1]), true, message);
         const std::chrono::duration<double, std::milli> took =
             std::chrono::steady_clock::now() - start;
         if (converter.GetLastLoadError().code != 0 || message.Length() != 0) {

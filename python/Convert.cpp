@@ -6,10 +6,10 @@
 #include <string>
 
 #include "Bindings.h"
+#include "ops/JsonFormat.h"
 #include "ops/ValueLayout.h"
 #include "platform/ComError.h"
 #include "platform/KestCalmorphDLLError.h"
-#include "ops/JsonFormat.h"
 
 namespace kest::python {
 
@@ -115,10 +115,18 @@ py::object ValuesOut(const ops::Item& item) {
         py::list list;
         for (const ops::Value& value : elements) {
             switch (value.GetKind()) {
-            case ops::Value::Kind::kInteger: list.append(py::int_(value.Integer())); break;
-            case ops::Value::Kind::kDouble: list.append(py::float_(value.Number())); break;
-            case ops::Value::Kind::kString: list.append(py::str(value.Text())); break;
-            case ops::Value::Kind::kEmpty: list.append(py::none()); break;
+                case ops::Value::Kind::kInteger:
+                    list.append(py::int_(value.Integer()));
+                    break;
+                case ops::Value::Kind::kDouble:
+                    list.append(py::float_(value.Number()));
+                    break;
+                case ops::Value::Kind::kString:
+                    list.append(py::str(value.Text()));
+                    break;
+                case ops::Value::Kind::kEmpty:
+                    list.append(py::none());
+                    break;
             }
         }
         return std::move(list);
@@ -164,8 +172,10 @@ std::vector<ops::Value> NumbersIn(py::handle input, const std::string& what) {
         for (py::ssize_t i = 0; i < in.shape(0); ++i) values.push_back(ops::Value::Double(in(i)));
         return values;
     }
-    throw py::type_error(what + " must be numbers (an integer or float array or scalar), not "
-                         "an array of dtype " + py::str(array.dtype()).cast<std::string>());
+    throw py::type_error(what +
+                         " must be numbers (an integer or float array or scalar), not "
+                         "an array of dtype " +
+                         py::str(array.dtype()).cast<std::string>());
 }
 
 void PointsIn(ops::Axis& axis, py::handle points, const std::string& item) {
@@ -178,8 +188,8 @@ void PointsIn(ops::Axis& axis, py::handle points, const std::string& item) {
     }
     const std::size_t length = ops::AxisLength(axis);
     if (static_cast<std::size_t>(array.size()) != length) {
-        throw py::value_error(what + ": the axis has " + std::to_string(length) +
-                              " points, got " + std::to_string(array.size()));
+        throw py::value_error(what + ": the axis has " + std::to_string(length) + " points, got " +
+                              std::to_string(array.size()));
     }
     std::vector<ops::Value> values = NumbersIn(array, what);
     axis.points.elements = std::move(values);
@@ -192,8 +202,7 @@ void ValuesIn(ops::Item& item, py::handle input) {
     const std::size_t count = item.values.elements.size();
     if (IsTextFormat(item.format)) {
         if (py::isinstance<py::str>(input) || !py::isinstance<py::sequence>(input)) {
-            throw py::type_error(what + " must be a list of str for a " + *item.format +
-                                 " item");
+            throw py::type_error(what + " must be a list of str for a " + *item.format + " item");
         }
         py::sequence sequence = py::reinterpret_borrow<py::sequence>(input);
         if (!item.axes.empty() && sequence.size() != count) {
@@ -221,8 +230,10 @@ void ValuesIn(ops::Item& item, py::handle input) {
         }
         array = np.attr("broadcast_to")(array, shape);
     } else if (array.ndim() > 1) {
-        throw py::value_error(what + ": an item without axes takes a scalar or a 1-D array, "
-                                     "got shape " + ShapeText(array.attr("shape")));
+        throw py::value_error(what +
+                              ": an item without axes takes a scalar or a 1-D array, "
+                              "got shape " +
+                              ShapeText(array.attr("shape")));
     }
     std::vector<ops::Value> values = NumbersIn(array, what);
     bool integers = count > 0;
@@ -232,8 +243,9 @@ void ValuesIn(ops::Item& item, py::handle input) {
     if (integers) {
         for (const ops::Value& value : values) {
             if (value.GetKind() == ops::Value::Kind::kDouble && std::isnan(value.Number())) {
-                throw py::value_error(what + " are integers; NaN is not one (assign a float "
-                                             "array without NaN, or set the element apart)");
+                throw py::value_error(what +
+                                      " are integers; NaN is not one (assign a float "
+                                      "array without NaN, or set the element apart)");
             }
         }
     }
@@ -262,8 +274,8 @@ void RaiseCurrent(const std::string& file, const std::string& item) {
                        py::arg("item") = item.empty() ? text : item, py::arg("file") = file));
     } catch (const _com_error& error) {
         Raise("WriteError", file + ": " + error.Description(),
-              py::dict(py::arg("reason") = static_cast<long>(error.Error()),
-                       py::arg("item") = item, py::arg("file") = file));
+              py::dict(py::arg("reason") = static_cast<long>(error.Error()), py::arg("item") = item,
+                       py::arg("file") = file));
     } catch (const ops::JsonImportError& error) {
         Raise("JsonError", error.what(),
               py::dict(py::arg("path") = error.Path(), py::arg("file") = file));

@@ -32,7 +32,8 @@ KestReadOptions OptionsOf(const std::optional<std::string>& schema, bool validat
 }
 
 py::dict LoadFields(const KestLoadError& error, const std::string& path) {
-    return py::dict(py::arg("reason") = error.code, py::arg("file") = error.file.empty() ? path : error.file,
+    return py::dict(py::arg("reason") = error.code,
+                    py::arg("file") = error.file.empty() ? path : error.file,
                     py::arg("line") = error.line, py::arg("column") = error.column,
                     py::arg("hint") = error.hint);
 }
@@ -206,9 +207,8 @@ PYBIND11_MODULE(_core, m) {
     auto method = [&cls](const char* name, py::cpp_function function) {
         cls.attr(name) = function;
     };
-    method("write", py::cpp_function(&Write, py::is_method(cls), py::name("write"),
-                                     py::arg("path"), py::arg("comment") = "",
-                                     py::arg("indent") = false,
+    method("write", py::cpp_function(&Write, py::is_method(cls), py::name("write"), py::arg("path"),
+                                     py::arg("comment") = "", py::arg("indent") = false,
                                      "Writes the tree to a CDF file (UTF-8)."));
     method("to_json", py::cpp_function(&ToJson, py::is_method(cls), py::name("to_json"),
                                        "The tree as the library's lossless JSON text."));

@@ -89,8 +89,7 @@ struct History {
 py::object DateOut(const std::string& text) {
     py::module_ datetime = py::module_::import("datetime");
     try {
-        return datetime.attr("datetime").attr("strptime")(text.substr(0, 19),
-                                                           "%Y-%m-%dT%H:%M:%S");
+        return datetime.attr("datetime").attr("strptime")(text.substr(0, 19), "%Y-%m-%dT%H:%M:%S");
     } catch (const py::error_already_set&) {
         return py::str(text);  // a date the reader kept as written
     }
@@ -107,8 +106,8 @@ std::string DateIn(py::handle date) {
     try {
         (void)ops::ToCalData(probe);
     } catch (const KestCalmorphDLLError& error) {
-        throw py::value_error("the date " + text + " cannot be kept: " +
-                              ReasonText(error.GetReason()));
+        throw py::value_error("the date " + text +
+                              " cannot be kept: " + ReasonText(error.GetReason()));
     }
     return text;
 }
@@ -138,8 +137,7 @@ void TextProperty(py::class_<View>& cls, const char* name, Field field, bool opt
     cls.def_property(
         name,
         [field](const View& view) -> py::object {
-            if constexpr (std::is_same_v<std::decay_t<decltype(view.Get().*field)>,
-                                         std::string>) {
+            if constexpr (std::is_same_v<std::decay_t<decltype(view.Get().*field)>, std::string>) {
                 return py::str(view.Get().*field);
             } else {
                 return TextOut(view.Get().*field);
@@ -259,14 +257,17 @@ void BindTree(py::module_& m) {
              })
         .def("__iter__",
              [](const Lists& s) {
-                 return AllOf([&s](std::size_t i) { return ListRef{s.tree, i}; },
-                              s.tree->document.lists.size())
+                 return AllOf(
+                            [&s](std::size_t i) {
+                                return ListRef{s.tree, i};
+                            },
+                            s.tree->document.lists.size())
                      .attr("__iter__")();
              })
         .def(
             "new",
-            [](const Lists& s, py::handle name, py::handle symbolic_file,
-               py::handle target_image, py::handle note) {
+            [](const Lists& s, py::handle name, py::handle symbolic_file, py::handle target_image,
+               py::handle note) {
                 ops::CalList list;
                 list.name = TextArg(name, "list name");
                 list.symbolicFile = FileRefIn(symbolic_file, "symbolic_file");
@@ -292,10 +293,11 @@ void BindTree(py::module_& m) {
             [](const ListRef& r, py::handle v) {
                 r.Get().targetImage = FileRefIn(v, "target_image");
             })
-        .def_property_readonly("items", [](const ListRef& r) {
-            r.Get();
-            return Items{r};
-        })
+        .def_property_readonly("items",
+                               [](const ListRef& r) {
+                                   r.Get();
+                                   return Items{r};
+                               })
         .def("__repr__", [](const ListRef& r) {
             return "<CalList " + r.Get().name.value_or("") + ": " +
                    std::to_string(r.Get().items.size()) + " items>";
@@ -362,8 +364,8 @@ void BindTree(py::module_& m) {
                 return ItemRef{s.list.tree, s.list.list, list.items.size() - 1};
             },
             py::arg("name"), py::arg("values"), py::kw_only(), py::arg("format") = py::none(),
-            py::arg("units") = "", py::arg("axes") = py::none(),
-            py::arg("annotation") = py::none(), py::arg("note") = py::none());
+            py::arg("units") = "", py::arg("axes") = py::none(), py::arg("annotation") = py::none(),
+            py::arg("note") = py::none());
 
     py::class_<ItemRef> calitem(m, "CalItem");
     TextProperty(calitem, "name", &ops::Item::name, false);
@@ -375,16 +377,18 @@ void BindTree(py::module_& m) {
         .def_property(
             "values", [](const ItemRef& r) { return ValuesOut(r.Get()); },
             [](const ItemRef& r, py::handle v) { ValuesIn(r.Get(), v); })
-        .def_property_readonly("axes", [](const ItemRef& r) {
-            r.Get();
-            return Axes{r};
-        })
-        .def_property_readonly("list",
-                               [](const ItemRef& r) { return ListRef{r.tree, r.list}; })
-        .def_property_readonly("shape",
+        .def_property_readonly("axes",
                                [](const ItemRef& r) {
-                                   return py::tuple(py::cast(ops::LayoutOf(r.Get()).shape));
+                                   r.Get();
+                                   return Axes{r};
                                })
+        .def_property_readonly("list",
+                               [](const ItemRef& r) {
+                                   return ListRef{r.tree, r.list};
+                               })
+        .def_property_readonly(
+            "shape",
+            [](const ItemRef& r) { return py::tuple(py::cast(ops::LayoutOf(r.Get()).shape)); })
         .def("__repr__", [](const ItemRef& r) {
             return "<CalItem " + r.Name() + " " + r.Get().format.value_or("") + ">";
         });
@@ -396,8 +400,11 @@ void BindTree(py::module_& m) {
                  return AxisRef{s.item, Index(i, s.item.Get().axes.size(), "axis index")};
              })
         .def("__iter__", [](const Axes& s) {
-            return AllOf([&s](std::size_t i) { return AxisRef{s.item, i}; },
-                         s.item.Get().axes.size())
+            return AllOf(
+                       [&s](std::size_t i) {
+                           return AxisRef{s.item, i};
+                       },
+                       s.item.Get().axes.size())
                 .attr("__iter__")();
         });
 
@@ -411,21 +418,24 @@ void BindTree(py::module_& m) {
 
     py::class_<History>(m, "History")
         .def("__len__", [](const History& s) { return s.tree->document.history.size(); })
-        .def("__getitem__",
-             [](const History& s, py::ssize_t i) {
-                 return ChangeRef{s.tree,
-                                  Index(i, s.tree->document.history.size(), "change index")};
-             })
+        .def(
+            "__getitem__",
+            [](const History& s, py::ssize_t i) {
+                return ChangeRef{s.tree, Index(i, s.tree->document.history.size(), "change index")};
+            })
         .def("__iter__",
              [](const History& s) {
-                 return AllOf([&s](std::size_t i) { return ChangeRef{s.tree, i}; },
-                              s.tree->document.history.size())
+                 return AllOf(
+                            [&s](std::size_t i) {
+                                return ChangeRef{s.tree, i};
+                            },
+                            s.tree->document.history.size())
                      .attr("__iter__")();
              })
         .def(
             "new",
-            [](const History& s, py::handle user, py::handle date, py::handle tool,
-               py::handle note, py::handle version) {
+            [](const History& s, py::handle user, py::handle date, py::handle tool, py::handle note,
+               py::handle version) {
                 ops::Change change;
                 change.user = TextArg(user, "user");
                 change.date = DateIn(date);
