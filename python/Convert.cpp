@@ -77,26 +77,35 @@ std::string PathArg(py::handle path) {
     return bytes;
 }
 
-py::object PointsOut(const ops::ValueList& points) {
-    if (!points.present) return py::none();
+namespace {
+
+// The elements as a new array of `shape`, filled in C order.
+py::object NumbersOut(const std::vector<ops::Value>& elements,
+                      const std::vector<std::size_t>& shape) {
     bool integers = true;
-    for (const ops::Value& value : points.elements) {
+    for (const ops::Value& value : elements) {
         integers = integers && value.GetKind() == ops::Value::Kind::kInteger;
     }
-    const py::ssize_t count = static_cast<py::ssize_t>(points.elements.size());
+    std::vector<py::ssize_t> dims(shape.begin(), shape.end());
     if (integers) {
-        py::array_t<std::int32_t> array(count);
-        auto out = array.mutable_unchecked<1>();
-        for (py::ssize_t i = 0; i < count; ++i) out(i) = points.elements[i].Integer();
+        py::array_t<std::int32_t> array(dims);
+        std::int32_t* out = array.mutable_data();
+        for (const ops::Value& value : elements) *out++ = value.Integer();
         return std::move(array);
     }
-    py::array_t<double> array(count);
-    auto out = array.mutable_unchecked<1>();
-    for (py::ssize_t i = 0; i < count; ++i) {
-        const ops::Value& value = points.elements[i];
-        out(i) = value.IsNumber() ? value.Number() : std::numeric_limits<double>::quiet_NaN();
+    py::array_t<double> array(dims);
+    double* out = array.mutable_data();
+    for (const ops::Value& value : elements) {
+        *out++ = value.IsNumber() ? value.Number() : std::numeric_limits<double>::quiet_NaN();
     }
     return std::move(array);
+}
+
+}  // namespace
+
+py::object PointsOut(const ops::ValueList& points) {
+    if (!points.present) return py::none();
+    return NumbersOut(points.elements, {points.elements.size()});
 }
 
 py::object ValuesOut(const ops::Item& item) {
@@ -131,11 +140,8 @@ py::object ValuesOut(const ops::Item& item) {
         }
         return std::move(list);
     }
-    ops::ValueList flat = item.values;
-    flat.present = true;
-    py::array array = PointsOut(flat);
-    const ops::ValueLayout layout = ops::LayoutOf(item);
-    return array.attr("reshape")(ShapeTuple(layout.shape));
+    // The layout's shape holds exactly the elements (else it is their count, 1-D).
+    return NumbersOut(elements, ops::LayoutOf(item).shape);
 }
 
 std::vector<ops::Value> NumbersIn(py::handle input, const std::string& what) {
