@@ -4,7 +4,7 @@ set -euo pipefail
 KEST_PACKAGES=(build-essential cmake ninja-build pkg-config libexpat1-dev libxml2-dev
                libxml2-utils libcurl4-openssl-dev libgtest-dev libgmock-dev libbenchmark-dev
                python3 locales nlohmann-json3-dev python3-jsonschema libcli11-dev zlib1g-dev
-               chromium)
+               chromium pybind11-dev python3-dev python3-numpy python3-pytest)
 missing=()
 for p in "${KEST_PACKAGES[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
