@@ -138,27 +138,14 @@ void LocalHttpServer::Stop() noexcept {
     m_pid = -1;
 }
 
-SilentServer::SilentServer() {
-    int fd = BindAnyLocalPort(m_port);
-    if (fd < 0) return;
-    if (::listen(fd, 16) != 0) {
-        ::close(fd);
-        return;
-    }
-    m_socket = fd;
-}
-
-SilentServer::~SilentServer() {
-    if (m_socket >= 0) ::close(m_socket);
-}
-
-std::string SilentServer::Url(const std::string& file) const {
-    return "http://127.0.0.1:" + std::to_string(m_port) + "/" + file;
-}
-
-CannedHttpServer::CannedHttpServer(std::string response) : m_response(std::move(response)) {
+CannedHttpServer::CannedHttpServer(std::optional<std::string> response) {
     m_socket = BindAnyLocalPort(m_port);
-    if (m_socket < 0 || ::listen(m_socket, 16) != 0) return;
+    if (m_socket >= 0 && ::listen(m_socket, 16) != 0) {
+        ::close(m_socket);
+        m_socket = -1;
+    }
+    if (m_socket < 0 || !response) return;
+    m_response = std::move(*response);
     m_thread = std::thread([this] {
         pollfd waiting{m_socket, POLLIN, 0};
         // Shutting the socket down (in the destructor) ends the poll.
@@ -174,7 +161,7 @@ CannedHttpServer::CannedHttpServer(std::string response) : m_response(std::move(
 }
 
 CannedHttpServer::~CannedHttpServer() {
-    ::shutdown(m_socket, SHUT_RDWR);
+    if (m_socket >= 0) ::shutdown(m_socket, SHUT_RDWR);
     if (m_thread.joinable()) m_thread.join();
     if (m_socket >= 0) ::close(m_socket);
 }

@@ -3,6 +3,7 @@
 
 #include <sys/types.h>
 
+#include <optional>
 #include <string>
 #include <thread>
 
@@ -35,32 +36,17 @@ class LocalHttpServer {
     std::string m_error;
 };
 
-/// A socket on 127.0.0.1 that accepts connections into its backlog and never answers, for
-/// testing timeouts.
-class SilentServer {
-  public:
-    SilentServer();
-    ~SilentServer();
-    SilentServer(const SilentServer&) = delete;
-    SilentServer& operator=(const SilentServer&) = delete;
-
-    bool Started() const noexcept { return m_socket >= 0; }
-    std::string Url(const std::string& file) const;
-
-  private:
-    int m_socket = -1;
-    int m_port = 0;
-};
-
 /// Answers every request on 127.0.0.1 with the same raw response (status line, headers and
-/// body as given), from a thread, until destroyed.
+/// body as given), from a thread, until destroyed. Without a response it accepts connections
+/// into its backlog and never answers, for testing timeouts.
 class CannedHttpServer {
   public:
-    explicit CannedHttpServer(std::string response);
+    explicit CannedHttpServer(std::optional<std::string> response = std::nullopt);
     ~CannedHttpServer();
     CannedHttpServer(const CannedHttpServer&) = delete;
     CannedHttpServer& operator=(const CannedHttpServer&) = delete;
 
+    bool Started() const noexcept { return m_socket >= 0; }
     std::string Url(const std::string& file) const;
 
   private:
@@ -69,6 +55,7 @@ class CannedHttpServer {
     int m_port = 0;
     std::thread m_thread;
 };
+using SilentServer = CannedHttpServer;
 
 /// A port on 127.0.0.1 that was free a moment ago (0 when none could be found).
 int FindFreeLocalPort();
