@@ -10,6 +10,7 @@
 
 #include "../platform/KestCalmorphDLLError.h"
 #include "../text/KestCdfDate.h"
+#include "detail/JsonText.h"
 
 namespace kest {
 namespace ops {
@@ -40,40 +41,7 @@ class Writer {
         out += key;
         out += "\": ";
     }
-    void String(std::string_view text) {
-        out += '"';
-        std::size_t run = 0;
-        for (std::size_t i = 0; i < text.size(); ++i) {
-            const unsigned char c = static_cast<unsigned char>(text[i]);
-            if (c >= 0x20 && c != '"' && c != '\\') continue;
-            out.append(text.data() + run, i - run);
-            run = i + 1;
-            switch (c) {
-                case '"':
-                    out += "\\\"";
-                    break;
-                case '\\':
-                    out += "\\\\";
-                    break;
-                case '\n':
-                    out += "\\n";
-                    break;
-                case '\r':
-                    out += "\\r";
-                    break;
-                case '\t':
-                    out += "\\t";
-                    break;
-                default: {
-                    char escape[8];
-                    std::snprintf(escape, sizeof escape, "\\u%04x", c);
-                    out += escape;
-                }
-            }
-        }
-        out.append(text.data() + run, text.size() - run);
-        out += '"';
-    }
+    void String(std::string_view text) { detail::AppendJsonString(out, text); }
     void Nullable(const std::optional<std::string>& text) {
         if (text)
             String(*text);

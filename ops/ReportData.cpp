@@ -10,45 +10,16 @@
 #include "Check.h"
 #include "Diff.h"
 #include "ValueLayout.h"
+#include "detail/JsonText.h"
 
 namespace kest {
 namespace ops {
 
 namespace {
 
+// Every "<" escaped: the data sits inside the page's script element.
 void AppendString(std::string& out, const std::string& text) {
-    out += '"';
-    for (unsigned char c : text) {
-        switch (c) {
-            case '"':
-                out += "\\\"";
-                break;
-            case '\\':
-                out += "\\\\";
-                break;
-            case '\n':
-                out += "\\n";
-                break;
-            case '\r':
-                out += "\\r";
-                break;
-            case '\t':
-                out += "\\t";
-                break;
-            case '<':
-                out += "\\u003c";
-                break;  // never "</script" or "<!--" inside the element
-            default:
-                if (c < 0x20) {
-                    char buffer[8];
-                    std::snprintf(buffer, sizeof buffer, "\\u%04x", c);
-                    out += buffer;
-                } else {
-                    out += static_cast<char>(c);
-                }
-        }
-    }
-    out += '"';
+    detail::AppendJsonString(out, text, true);
 }
 
 void AppendOptional(std::string& out, const std::optional<std::string>& text) {
