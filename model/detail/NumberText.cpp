@@ -301,6 +301,26 @@ bool FormatScaled(double magnitude, bool negative, char*& out) noexcept {
 
 namespace {
 
+// Digits and decimal exponent of the shortest text that reads back as `magnitude` (finite, > 0).
+int ShortestDigits(double magnitude, char* digits, int& exponent) noexcept {
+    char text[kDoubleTextCapacity];
+    const char* const end =
+        std::to_chars(text, text + sizeof text, magnitude, std::chars_format::scientific).ptr;
+    const char* p = text;
+    int count = 0;
+    digits[count++] = *p++;
+    if (*p == '.') {
+        ++p;
+        while (*p != 'e') digits[count++] = *p++;
+    }
+    ++p;  // 'e'
+    const bool negativeExponent = *p++ == '-';
+    exponent = 0;
+    for (; p != end; ++p) exponent = exponent * 10 + (*p - '0');
+    if (negativeExponent) exponent = -exponent;
+    return count;
+}
+
 // FormatDouble; `readsBack` tells whether the text is known to read back as the value (the
 // whole-number and scaled paths check that as they go; the rounded shortest digits may not).
 char* FormatDouble15(double value, char* buffer, bool& readsBack) noexcept {
@@ -332,24 +352,9 @@ char* FormatDouble15(double value, char* buffer, bool& readsBack) noexcept {
     // value unless the tail is exactly "5": a fifteen-digit rounding boundary strictly
     // between the value and its shortest digits would itself read back as the value while
     // being shorter, or as short and closer.
-    char shortest[kDoubleTextCapacity];
-    const char* const shortestEnd = std::to_chars(shortest, shortest + sizeof shortest, magnitude,
-                                                  std::chars_format::scientific)
-                                        .ptr;
-    // Form: d[.ddd]e(+|-)dd[d]
-    const char* p = shortest;
     char digits[20];
-    int count = 0;
-    digits[count++] = *p++;
-    if (*p == '.') {
-        ++p;
-        while (*p != 'e') digits[count++] = *p++;
-    }
-    ++p;  // 'e'
-    const bool negativeExponent = *p++ == '-';
     int exponent = 0;
-    for (; p != shortestEnd; ++p) exponent = exponent * 10 + (*p - '0');
-    if (negativeExponent) exponent = -exponent;
+    int count = ShortestDigits(magnitude, digits, exponent);
 
     if (count > kPrecision) {
         readsBack = false;
@@ -380,26 +385,6 @@ char* FormatDouble(double value, char* buffer) noexcept {
 }
 
 namespace {
-
-// Digits and decimal exponent of the shortest text that reads back as `magnitude` (finite, > 0).
-int ShortestDigits(double magnitude, char* digits, int& exponent) noexcept {
-    char text[kDoubleTextCapacity];
-    const char* const end =
-        std::to_chars(text, text + sizeof text, magnitude, std::chars_format::scientific).ptr;
-    const char* p = text;
-    int count = 0;
-    digits[count++] = *p++;
-    if (*p == '.') {
-        ++p;
-        while (*p != 'e') digits[count++] = *p++;
-    }
-    ++p;  // 'e'
-    const bool negativeExponent = *p++ == '-';
-    exponent = 0;
-    for (; p != end; ++p) exponent = exponent * 10 + (*p - '0');
-    if (negativeExponent) exponent = -exponent;
-    return count;
-}
 
 bool SameDouble(double a, double b) noexcept {
     return a == b && std::signbit(a) == std::signbit(b);
