@@ -154,16 +154,16 @@ void TextProperty(py::class_<View>& cls, const char* name, Field field, bool opt
         });
 }
 
-ops::Axis AxisIn(py::handle spec, const std::string& item) {
+ops::Axis AxisIn(py::handle given, const std::string& item) {
     ops::Axis axis;
     axis.format = "NUMERIC";
     axis.units = "";
-    if (py::isinstance<py::int_>(spec)) {
-        axis.size = spec.cast<std::int32_t>();
+    if (py::isinstance<py::int_>(given)) {
+        axis.size = given.cast<std::int32_t>();
         return axis;
     }
     py::module_ np = py::module_::import("numpy");
-    py::array array = np.attr("asarray")(spec);
+    py::array array = np.attr("asarray")(given);
     if (array.ndim() != 1) throw py::value_error("axis points must be a 1-D array");
     axis.points.elements = NumbersIn(array, "axis points of item '" + item + "'");
     axis.points.present = true;
@@ -350,7 +350,7 @@ void BindTree(py::module_& m) {
                 item.annotation = OptionalTextArg(annotation, "annotation");
                 item.note = OptionalTextArg(note, "note");
                 if (!axes.is_none()) {
-                    for (py::handle spec : axes) item.axes.push_back(AxisIn(spec, *item.name));
+                    for (py::handle given : axes) item.axes.push_back(AxisIn(given, *item.name));
                 }
                 // Values go in against the finished axes; a new item starts with as many
                 // elements as they hold, so ValuesIn can check the shape.
