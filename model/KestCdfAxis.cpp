@@ -8,10 +8,10 @@
 #include <utility>
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
+#include "KestCdfReadWarnings.h"
 #include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
-#include "KestCdfReadWarnings.h"
-#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -89,8 +89,7 @@ KestCdfAxis::~KestCdfAxis() = default;
 _variant_t KestCdfAxis::GetAxisValue() const { return m_value; }
 
 void KestCdfAxis::SetAxisElements(const _variant_t& elements) {
-    if (elements.vt != (VT_ARRAY | VT_VARIANT) || !elements.parray ||
-        elements.parray->cDims != 1)
+    if (elements.vt != (VT_ARRAY | VT_VARIANT) || !elements.parray || elements.parray->cDims != 1)
         throw _com_error(E_INVALIDARG);
     m_value = elements;
 }

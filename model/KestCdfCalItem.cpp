@@ -1,7 +1,7 @@
 #include "KestCdfCalItem.h"
 
-#include "detail/DomWriting.h"
 #include "KestCdfReadWarnings.h"
+#include "detail/DomWriting.h"
 
 #include "../platform/KestCalmorphDLLError.h"
 #include "../platform/XmlFileWriter.h"

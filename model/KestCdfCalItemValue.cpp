@@ -4,10 +4,10 @@
 #include <utility>
 
 #include "../platform/KestCalmorphDLLError.h"
+#include "../platform/XmlFileWriter.h"
+#include "KestCdfReadWarnings.h"
 #include "detail/DomWriting.h"
 #include "detail/ValueListCodec.h"
-#include "KestCdfReadWarnings.h"
-#include "../platform/XmlFileWriter.h"
 
 namespace kest {
 
@@ -68,8 +68,7 @@ void KestCdfCalItemValue::SetValue(_variant_t value) {
 }
 
 void KestCdfCalItemValue::SetValueElements(const _variant_t& elements) {
-    if (elements.vt != (VT_ARRAY | VT_VARIANT) || !elements.parray ||
-        elements.parray->cDims != 1)
+    if (elements.vt != (VT_ARRAY | VT_VARIANT) || !elements.parray || elements.parray->cDims != 1)
         throw _com_error(E_INVALIDARG);
     m_value = elements;
 }

@@ -1,7 +1,7 @@
 #include "KestCdfChange.h"
 
-#include "detail/DomWriting.h"
 #include "../platform/XmlFileWriter.h"
+#include "detail/DomWriting.h"
 
 namespace kest {
 

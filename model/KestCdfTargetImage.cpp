@@ -3,8 +3,8 @@
 #include "detail/DomWriting.h"
 
 #include "../platform/KestCalmorphDLLError.h"
-#include "KestCdfSymbolicFile.h"
 #include "../platform/XmlFileWriter.h"
+#include "KestCdfSymbolicFile.h"
 
 namespace kest {
 

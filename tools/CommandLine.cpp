@@ -69,9 +69,9 @@ constexpr const char* kOverview =
 
 // Every command of the tool, in the order of the help text.
 constexpr Command (*kCommands[])(CLI::App&) = {
-    AddInfoCommand,     AddShowCommand,  AddConvertCommand, AddExportCommand,
-    AddImportCommand,   AddDiffCommand,  AddMergeCommand,   AddCheckCommand,
-    AddReportCommand,   AddValidateCommand, AddSchemaLocationCommand};
+    AddInfoCommand,   AddShowCommand,     AddConvertCommand,       AddExportCommand,
+    AddImportCommand, AddDiffCommand,     AddMergeCommand,         AddCheckCommand,
+    AddReportCommand, AddValidateCommand, AddSchemaLocationCommand};
 
 }  // namespace
 

@@ -9,9 +9,9 @@
 #include <vector>
 
 #include "ValueListTestUtil.h"
-#include "platform/KestCalmorphDLLError.h"
 #include "model/KestCdfAxis.h"
 #include "model/KestCdfCalItemValue.h"
+#include "platform/KestCalmorphDLLError.h"
 #include "platform/XmlDom.h"
 
 using namespace kest;
@@ -280,7 +280,9 @@ TEST(KestCdfAxis, SplitsTextByFormatTypeAndWritesItBack) {
          u"4294967296.0 -4294967296.0"},
         {u"NUMERIC", u"inf -INFINITY 1. 0x1p3", {R8(inf), R8(-inf), R8(1), R8(8)}, u"inf -inf 1 8"},
         {u"NUMERIC", u"1." + std::u16string(200, u'0') + u"1 7", {R8(1.0), R8(7)}, u"1 7"},
-        {u"NUMERIC", u"0.1 0.30000000000000004", {R8(0.1), R8(0.30000000000000004)},
+        {u"NUMERIC",
+         u"0.1 0.30000000000000004",
+         {R8(0.1), R8(0.30000000000000004)},
          u"0.1 0.30000000000000004"},
         {u"STRING", u"\"a b\" \"c\"", {Str(u"a b"), Str(u"c")}, u"\"a b\" \"c\""},
         {u"STRING", u"\"\" x \"y", {Str(u"")}, u"\"\""},
@@ -447,7 +449,10 @@ TEST(KestCdfCalItemValue, StoresTextByFormatTypeAndOriginAndWritesItBack) {
         {true, u"NUMERIC", u"7", {R8(7)}, u"7"},
         {true, u"NUMERIC", u"1e5 2", {R8(1e5), I4(2)}, u"100000 2"},
         {true, u"NUMERIC", u"2 1e5 3.5e-7", {R8(2), I4(1), R8(3.5e-7)}, u"2 1 3.5e-007"},
-        {true, u"NUMERIC", u"1e20 -9999999999", {R8(1e20), R8(-9999999999.0)},
+        {true,
+         u"NUMERIC",
+         u"1e20 -9999999999",
+         {R8(1e20), R8(-9999999999.0)},
          u"1.0e+020 -9999999999.0"},
         {true,
          u"NUMERIC",

@@ -464,12 +464,11 @@ TEST(KestCdfValueListCodec, LongListsAreWrittenAndReadWhole) {
     std::vector<Element> numbers;
     std::string expected;
     for (int i = 0; i < kNumbers; ++i) {
-        values.push_back(i % 3 == 1
-                             ? _variant_t(-i)
-                             // Values whose "%.15g" text reads back, so that it is the text
-                             // written.
-                             : _variant_t(ReferenceAtof(ReferenceFormat(
-                                   (i + 0.25) * (100.0 / 255) * (i % 3 ? 1e-9 : 1.0)))));
+        values.push_back(i % 3 == 1 ? _variant_t(-i)
+                                    // Values whose "%.15g" text reads back, so that it is the text
+                                    // written.
+                                    : _variant_t(ReferenceAtof(ReferenceFormat(
+                                          (i + 0.25) * (100.0 / 255) * (i % 3 ? 1e-9 : 1.0)))));
         const std::string token =
             i % 3 == 1 ? std::to_string(-i) : ReferenceFormat(values.back().dblVal);
         expected += token + ' ';
